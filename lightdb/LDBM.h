@@ -1,0 +1,44 @@
+// The light database module: the shipped reference spectra, the per-chip
+// database computed from them, and its cache file.
+//
+// Functions return SQLite result codes (0 = success) and a few of their own
+// (documented per function).
+#pragma once
+
+#include "lightdb/LDBMInfo.h"
+#include "lightdb/Matrices.h"
+
+#include <string>
+
+// Consumer of the reference scan: one call per Spectra row. Returns 0 to go on.
+typedef int (*LDBMSpectrumConsumer)(void* userData, int id, float* xyz, float* spectrum, int sampleCount);
+
+// Device path of the reference file that `type` selects.
+const char* LDBMBigDBPath(BigDBType type);
+// Device path of the cache file for an orientation ("…/bzrgbc_<o>.sqlite").
+std::string LDBMSmallDBPath(int orientation);
+
+// SQLite row callback that reads an Info row into the LDBMInfo `context`.
+int LDBMReadInfoRow(void* context, int columns, char** values, char** names);
+
+// Streams every Spectra row of the reference file to `consumer`.
+// 0 on success; the open's code; -1 when the IDs are not exactly 0..N-1 once
+// each; otherwise the statement's code.
+int LDBMParseBigDB(const LDBMInfo* info, LDBMSpectrumConsumer consumer, void* userData, BigDBType type);
+
+// Folds one reference spectrum with the channel spectra of `matrices`.
+int ProgressCallback(void* matrices, int id, float* xyz, float* spectrum, int sampleCount);
+
+// Reads the reference Info into `info`, then checks the cache for `orientation`;
+// when it is valid, sets *cacheValid and overwrites `info` with the cache's Info.
+int LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType type, float expectedSmallVersion);
+
+// Loads the cache's RR and XX tables into `responses` (responseRows x N) and
+// `xyz` (3 x N), N = info->sources.
+int LDBMParseSmallDB(int orientation, const LDBMInfo* info, float* xyz, float* responses, int responseRows);
+
+// Writes the cache file. 0; 2 when it cannot be opened; 4 when write-ahead
+// logging cannot be switched on; 3 for a channel count other than 4 or 5 or a
+// failed RR table; otherwise the failing statement's code.
+int LDBMCreateSmallDB(const LDBMInfo* info, const float* xyz, const float* responses, int orientation, int algo,
+                      int channelCount, unsigned chipID, float smallVersion);
