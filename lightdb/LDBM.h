@@ -23,18 +23,25 @@ int LDBMReadInfoRow(void* context, int columns, char** values, char** names);
 
 // Streams every Spectra row of the reference file to `consumer`.
 // 0 on success; the open's code; -1 when the IDs are not exactly 0..N-1 once
-// each; otherwise the statement's code.
+// each; otherwise the statement's code. A row without "ID", "X", "Y" or "Z",
+// or whose sample columns do not name every slot 0 .. C-5 once, stops the scan.
 int LDBMParseBigDB(const LDBMInfo* info, LDBMSpectrumConsumer consumer, void* userData, BigDBType type);
 
-// Folds one reference spectrum with the channel spectra of `matrices`.
+// Folds one reference spectrum with the channel spectra of `matrices`. Returns
+// non-zero (stopping the scan) when the row does not fit the record's arrays
+// or the source's weighted response total is 0 or not finite.
 int ProgressCallback(void* matrices, int id, float* xyz, float* spectrum, int sampleCount);
 
 // Reads the reference Info into `info`, then checks the cache for `orientation`;
 // when it is valid, sets *cacheValid and overwrites `info` with the cache's Info.
+// 0, the reference's open or statement code, or SQLITE_CORRUPT when the
+// reference gives a negative source count.
 int LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType type, float expectedSmallVersion);
 
 // Loads the cache's RR and XX tables into `responses` (responseRows x N) and
-// `xyz` (3 x N), N = info->sources.
+// `xyz` (3 x N), N = info->sources. Columns for rows at or beyond `responseRows`
+// are skipped. A table with more rows than N stops with SQLITE_ABORT, one
+// with fewer gives SQLITE_CORRUPT.
 int LDBMParseSmallDB(int orientation, const LDBMInfo* info, float* xyz, float* responses, int responseRows);
 
 // Writes the cache file. 0; 2 when it cannot be opened; 4 when write-ahead

@@ -3,6 +3,8 @@
 // the calibration code, consumed by ProgressCallback.
 #pragma once
 
+#include "lightdb/SpectralDatabase.h"
+
 #include <cstdint>
 #include <vector>
 
@@ -10,6 +12,7 @@ struct Matrices {
     float* xyzOut = nullptr;       // destination of XX (3 x nSources), not owned
     float* responsesOut = nullptr; // destination of RR ((nChannels - firstChannel) x nSources), not owned
     int32_t nSources = 0;          // N
+    int32_t responseRows = 0;      // rows of nSources floats that responsesOut holds
     int32_t nChannels = 0;         // channel columns of channelSpectra
     int32_t firstChannel = 0;      // first channel that becomes an RR row; earlier ones only normalise
     uint8_t irCompensation = 0;    // scale the near-infrared tail of the spectra
@@ -17,6 +20,15 @@ struct Matrices {
     std::vector<int32_t> channelSpectra; // sample-major: [s * nChannels + c]
     std::vector<float> channelWeights;   // nChannels weights of the normaliser
     std::vector<float> irCoefficients;   // nChannels tail factors, or empty
+
+    // Points the outputs at a database sized by SpectralDatabase::allocate.
+    void bindOutputs(SpectralDatabase& db)
+    {
+        xyzOut = db.dbXYZ.data();
+        responsesOut = db.dbChannelResponses.data();
+        nSources = int32_t(db.dbSampleCount);
+        responseRows = int32_t(db.dbChannelCount);
+    }
 
     // Spectral samples per channel held in channelSpectra.
     int32_t spectrumSamples() const

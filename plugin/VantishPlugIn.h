@@ -112,8 +112,11 @@ public:
     bool processSysConfigSensorCalibrationVD6286(CFDataRef& blob, long& entryOffset, ALSCalibrationHeader& header,
                                                  ALSCalibrationSubHeader& subHeader, long& recordSize,
                                                  CFDataRef& record);
+    // `build` is the private database that `matrices` points into; it is
+    // published once complete.
     bool processSysConfigSpectrumVD6286(bool asyncCreate, CFDataRef& blob, long& entryOffset,
-                                        ALSCalibrationSubHeader& subHeader, Matrices& matrices);
+                                        ALSCalibrationSubHeader& subHeader, Matrices& matrices,
+                                        const std::shared_ptr<SpectralDatabase>& build);
 
     // ---- Publication of the per-chip database ---------------------------------------------
     struct DatabaseSnapshot {
@@ -168,6 +171,7 @@ public:
     std::atomic<uint8_t> isDravikOS{0};
     std::atomic<uint32_t> qvtRetryCount{0};
     double machTimeToSeconds = 0.0;
+    std::atomic<uint64_t> shortSampleRecords{0}; // sample records too short to read (throttles their log line)
 
     mutable std::mutex dbMutex;                // guards database and dbReady
     std::recursive_mutex calibrationMutex;      // one calibration at a time per instance

@@ -1,0 +1,220 @@
+// Time per event of the colour fit, for database sizes and channel counts the
+// sensors have, in its three modes:
+//   raw         lambda 0, raw similarity weights (unregularised fit)
+//   normalised  lambda 0.01 with a normalised database (regularised normal equations)
+//   client      lambda 0.01 set by a client without normalisation (augmented system)
+// Beside each, a plain double-precision version of the same fit (weights,
+// normal equations, LU solve) as the baseline.
+//
+// Run: bench_colour --benchmark_repetitions=9 --benchmark_report_aggregates_only=true
+#include "plugin/VantishPlugIn.h"
+
+#include <benchmark/benchmark.h>
+
+#include <algorithm>
+#include <atomic>
+#include <cmath>
+#include <cstdlib>
+#include <random>
+#include <vector>
+
+// Heap calls of the process, so each benchmark can show how many one event makes.
+namespace {
+std::atomic<long> heapCalls{0};
+}
+extern "C" {
+void* __libc_malloc(size_t);
+void* __libc_calloc(size_t, size_t);
+void* __libc_realloc(void*, size_t);
+void __libc_free(void*);
+void* malloc(size_t size)
+{
+    heapCalls.fetch_add(1, std::memory_order_relaxed);
+    return __libc_malloc(size);
+}
+void* calloc(size_t count, size_t size)
+{
+    heapCalls.fetch_add(1, std::memory_order_relaxed);
+    return __libc_calloc(count, size);
+}
+void* realloc(void* p, size_t size) { return __libc_realloc(p, size); }
+void free(void* p) { __libc_free(p); }
+
+void dgesv_(const int* n, const int* nrhs, double* a, const int* lda, int* ipiv, double* b, const int* ldb,
+            int* info);
+}
+
+namespace {
+
+enum Mode { Raw, Normalised, ClientLambda };
+
+SpectralDatabase makeDatabase(int N, int M)
+{
+    std::mt19937 rng(2024);
+    std::uniform_real_distribution<float> response(0.05f, 1.0f);
+    SpectralDatabase db;
+    db.allocate(N, M);
+    for (int i = 0; i < N; ++i) {
+        float sum = 0.0f;
+        for (int j = 0; j < M; ++j) {
+            float r = response(rng);
+            db.dbChannelResponses[size_t(j) * N + i] = r;
+            sum += r;
+        }
+        for (int c = 0; c < 3; ++c) {
+            float t = 0.0f;
+            for (int j = 0; j < M; ++j)
+                t += float((c + 2 * j) % 5 + 1) * db.dbChannelResponses[size_t(j) * N + i];
+            db.dbXYZ[size_t(c) * N + i] = t + 0.2f * sum * sum / float(M);
+        }
+    }
+    return db;
+}
+
+// Unit-length samples, each channel divided by its deviation: what calibration
+// publishes in normalised mode.
+void normalise(VantishPlugIn& plugin, SpectralDatabase& db)
+{
+    int N = int(db.dbSampleCount), M = int(db.dbChannelCount);
+    plugin.normalizedByEuklidNorm(db.dbChannelResponses.data(), N, M);
+    db.channelStdDev.assign(M, 0.0f);
+    plugin.calculateSTD(db.dbChannelResponses.data(), db.channelStdDev.data(), N, M);
+    for (int j = 0; j < M; ++j)
+        if (db.channelStdDev[j] != 0.0f)
+            for (int i = 0; i < N; ++i)
+                db.dbChannelResponses[size_t(j) * N + i] /= db.channelStdDev[j];
+}
+
+struct Setup {
+    VantishPlugIn* plugin;
+    SpectralDatabase db;
+    std::vector<float> measured;
+
+    Setup(Mode mode, int N, int M)
+        : plugin(static_cast<VantishPlugIn*>(VantishPlugInFactory(kCFAllocatorDefault, kIOHIDServiceFilterPlugInTypeID))),
+          db(makeDatabase(N, M))
+    {
+        plugin->lambda = mode == Raw ? 0.0f : 0.01f;
+        plugin->lambdaConfigured = mode == Normalised ? 1 : 0;
+        if (mode == Normalised)
+            normalise(*plugin, db);
+        for (int j = 0; j < M; ++j)
+            measured.push_back(0.3f + 0.1f * float((j * 7) % 5));
+    }
+    ~Setup() { plugin->Release(); }
+};
+
+// The same fit written plainly in double precision.
+void baselineColour(const SpectralDatabase& db, const float* channels, double* xyz, bool normalised, double lambda,
+                    double exponent, double offset)
+{
+    const int N = int(db.dbSampleCount), M = int(db.dbChannelCount);
+    std::vector<double> x(channels, channels + M);
+    auto sigma = [&](int j) {
+        return normalised && !db.channelStdDev.empty() && db.channelStdDev[j] != 0.0f ? double(db.channelStdDev[j])
+                                                                                       : 1.0;
+    };
+    if (normalised) {
+        double length = 0.0;
+        for (double v : x)
+            length += v * v;
+        length = std::sqrt(length);
+        for (double& v : x)
+            v /= length;
+    }
+    std::vector<double> w(N);
+    for (int i = 0; i < N; ++i) {
+        double dot = 0.0, qq = 0.0, xx = 0.0;
+        for (int j = 0; j < M; ++j) {
+            double q = db.dbChannelResponses[size_t(j) * N + i] * sigma(j);
+            dot += q * x[j];
+            qq += q * q;
+            xx += x[j] * x[j];
+        }
+        w[i] = 1.0 / std::pow(1.0 - dot / std::sqrt(qq * xx) + offset, exponent);
+    }
+    if (normalised) {
+        double largest = *std::max_element(w.begin(), w.end());
+        for (double& v : w)
+            v /= largest;
+        for (int j = 0; j < M; ++j)
+            x[j] /= sigma(j);
+    }
+    double G[64] = {}, C[24] = {};
+    for (int i = 0; i < N; ++i) {
+        double r[8];
+        for (int j = 0; j < M; ++j)
+            r[j] = db.dbChannelResponses[size_t(j) * N + i];
+        for (int a = 0; a < M; ++a) {
+            for (int b = 0; b < M; ++b)
+                G[b * M + a] += w[i] * r[a] * r[b];
+            for (int c = 0; c < 3; ++c)
+                C[c * M + a] += w[i] * r[a] * db.dbXYZ[size_t(c) * N + i];
+        }
+    }
+    for (int a = 0; a < M; ++a)
+        G[a * M + a] += lambda;
+    int n = M, nrhs = 3, info = 0, pivots[8];
+    dgesv_(&n, &nrhs, G, &n, pivots, C, &n, &info);
+    for (int c = 0; c < 3; ++c) {
+        double sum = 0.0;
+        for (int j = 0; j < M; ++j)
+            sum += C[c * M + j] * x[j];
+        xyz[c] = std::max(sum, 0.0);
+    }
+}
+
+void reportHeapCalls(benchmark::State& state, long before)
+{
+    state.counters["heap/call"] =
+        benchmark::Counter(double(heapCalls.load() - before) / double(state.iterations()));
+}
+
+void BM_Colour(benchmark::State& state, Mode mode)
+{
+    Setup setup(mode, int(state.range(0)), int(state.range(1)));
+    const int M = int(state.range(1));
+    std::vector<float> x(M);
+    float xyz[3];
+    long before = heapCalls.load();
+    for (auto _ : state) {
+        std::copy(setup.measured.begin(), setup.measured.end(), x.begin());
+        setup.plugin->colourCalculationDynamic(setup.db, x.data(), xyz, M);
+        benchmark::DoNotOptimize(xyz);
+    }
+    reportHeapCalls(state, before);
+}
+
+void BM_Baseline(benchmark::State& state, Mode mode)
+{
+    Setup setup(mode, int(state.range(0)), int(state.range(1)));
+    double xyz[3];
+    double lambda = setup.plugin->lambda.load();
+    double exponent = setup.plugin->weightExponent.load();
+    double offset = setup.plugin->weightOffset.load();
+    long before = heapCalls.load();
+    for (auto _ : state) {
+        baselineColour(setup.db, setup.measured.data(), xyz, mode == Normalised, lambda, exponent, offset);
+        benchmark::DoNotOptimize(xyz);
+    }
+    reportHeapCalls(state, before);
+}
+
+void sizes(benchmark::internal::Benchmark* b)
+{
+    b->ArgNames({"N", "M"});
+    for (int N : {100, 400, 880})
+        for (int M : {4, 5})
+            b->Args({N, M});
+}
+
+BENCHMARK_CAPTURE(BM_Colour, raw, Raw)->Apply(sizes);
+BENCHMARK_CAPTURE(BM_Baseline, raw, Raw)->Apply(sizes);
+BENCHMARK_CAPTURE(BM_Colour, normalised, Normalised)->Apply(sizes);
+BENCHMARK_CAPTURE(BM_Baseline, normalised, Normalised)->Apply(sizes);
+BENCHMARK_CAPTURE(BM_Colour, client, ClientLambda)->Apply(sizes);
+BENCHMARK_CAPTURE(BM_Baseline, client, ClientLambda)->Apply(sizes);
+
+} // namespace
+
+BENCHMARK_MAIN();

@@ -1,0 +1,150 @@
+#include "calibration/FactoryDatabase.h"
+
+#include "calibration/CFOwned.h"
+#include "calibration/ColorCalibrationRecord.h"
+#include "calibration/SpectrumExtraction.h"
+#include "calibration/VD6287Layout.h"
+#include "calibration/XwCAT2Layout.h"
+#include "calibration/XwClLayout.h"
+#include "lightdb/LDBM.h"
+#include "plugin/Log.h"
+
+#include <memory>
+#include <utility>
+
+namespace calib {
+namespace {
+
+// The colour solver works with 4, 5 or 6 sensor channels.
+bool colourChannelsUsable(uint32_t channels) { return channels >= 4 && channels <= 6; }
+
+// Whether `db` holds arrays for all the sources its Info names, so the
+// reference scan cannot write past them.
+bool sizedForBuild(const SpectralDatabase& db, uint32_t rows)
+{
+    const size_t n = db.dbSampleCount;
+    return db.dbInfo.sources >= 0 && uint32_t(db.dbInfo.sources) == db.dbSampleCount && db.dbChannelCount == rows &&
+           db.dbXYZ.size() == 3 * n && db.dbChannelResponses.size() == size_t(rows) * n;
+}
+
+bool extractSpectrum(VantishPlugIn& p, const FactorySource& source, Matrices& m)
+{
+    CFDataRef data = source.data;
+    switch (source.layout) {
+    case FactoryLayout::VD6287:
+        return p.processQVTSpectrumVD6287_XwClv3(data, m);
+    case FactoryLayout::XwCAT2:
+        return p.processQVTSpectrumXwCAT2(data, m);
+    case FactoryLayout::XwCl:
+        return extractXwClSpectrum(p, {CFDataGetBytePtr(data), size_t(CFDataGetLength(data))},
+                                   source.xwclEntryOffset, m);
+    case FactoryLayout::None:
+        break;
+    }
+    return false;
+}
+
+// Builds `db` (sized by processCachedDB) from the reference spectra and the
+// unit's channel spectra and writes the cache. False when nothing was built.
+bool buildFromSpectra(VantishPlugIn& p, const FactorySource& source, SpectralDatabase& db)
+{
+    const uint32_t channels = p.numberOfChannels.load();
+    const uint32_t rows = p.dbChannelCount.load();
+    const uint32_t chipType = p.chipType.load();
+    if (!sizedForBuild(db, rows) || channels < rows)
+        return false;
+
+    Matrices m;
+    m.bindOutputs(db);
+    if (chipType == 1 || chipType == 2) {
+        m.nChannels = int32_t(rows);
+        m.firstChannel = 0;
+    } else {
+        m.nChannels = int32_t(channels);
+        m.firstChannel = int32_t(channels - rows);
+    }
+    if (!extractSpectrum(p, source, m))
+        return false;
+    if (LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, source.bigDBType) != 0)
+        return false;
+    VLOG_DEFAULT("Parsed big DB\n");
+
+    const int code = LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(),
+                                       int(p.orientation.load()), int(p.algoVersion.load()), int(rows),
+                                       p.chipId.load(), p.smallDBVersion.load());
+    if (code != 0)
+        VLOG_ERROR("Failed to create small DB %d\n", code);
+    else
+        VLOG_DEFAULT("Small DB has been created\n");
+    return true;
+}
+
+// Scales every sample's responses to unit length, then every channel by its
+// standard deviation over the samples (channels that do not vary stay as
+// they are). Done on the private database, before anyone can read it.
+void normaliseResponses(VantishPlugIn& p, SpectralDatabase& db)
+{
+    VLOG_INFO("RR normalization");
+    const int n = int(db.dbSampleCount);
+    const int m = int(db.dbChannelCount);
+    float* responses = db.dbChannelResponses.data();
+    p.normalizedByEuklidNorm(responses, n, m);
+    db.channelStdDev.assign(size_t(m), 0.0f);
+    p.calculateSTD(responses, db.channelStdDev.data(), n, m);
+    for (int c = 0; c < m; ++c) {
+        const float deviation = db.channelStdDev[size_t(c)];
+        if (deviation == 0.0f)
+            continue;
+        for (int i = 0; i < n; ++i)
+            responses[size_t(c) * size_t(n) + size_t(i)] /= deviation;
+    }
+}
+
+void sendColorCalibration(VantishPlugIn& p)
+{
+    if (!p.service || p.sensorType.load() != eALSSensorTypeVD6287)
+        return;
+    const VantishPlugIn::DatabaseSnapshot snapshot = p.snapshotDatabase();
+    if (!snapshot.ready)
+        return;
+    CFOwned<CFDataRef> record(createColorCalibrationRecord(*snapshot.db, p.numberOfChannels.load()));
+    if (record)
+        IOHIDServiceSetProperty(p.service, CFSTR("ALSColorCalibration"), record.get());
+}
+
+} // namespace
+
+FactoryLayout factoryLayoutOf(size_t length)
+{
+    switch (length) {
+    case stored::vd6287::kV3Size:
+        return FactoryLayout::VD6287;
+    case stored::xwca::kSize:
+        return FactoryLayout::XwCAT2;
+    case stored::xwcl::kOneEntrySize:
+    case stored::xwcl::kTwoEntrySize:
+        return FactoryLayout::XwCl;
+    default:
+        return FactoryLayout::None;
+    }
+}
+
+void finishFactoryDatabase(VantishPlugIn& p, const FactorySource& source, bool forceRebuild)
+{
+    SpectralDatabase db;
+    const bool usable = colourChannelsUsable(p.numberOfChannels.load());
+    const bool cached = p.processCachedDB(int(p.dbChannelCount.load()), source.bigDBType, db);
+    // A database that is not usable for colour is not published: the one
+    // already in place (if any) and dbReady stay as they were.
+    bool ready = cached && usable && !forceRebuild;
+    if (!ready)
+        ready = buildFromSpectra(p, source, db) && usable;
+    if (ready) {
+        if (p.lambdaConfigured.load())
+            normaliseResponses(p, db);
+        p.publishDatabase(std::make_shared<const SpectralDatabase>(std::move(db)), true);
+    }
+    sendColorCalibration(p);
+}
+
+} // namespace calib

@@ -1,0 +1,242 @@
+// The per-event colour estimate: a locally weighted, ridge-regularised linear
+// fit of X, Y, Z against the per-chip database. Every database sample is
+// weighted by how closely its channel vector points in the measured direction,
+// the solver fits a channel-to-XYZ matrix to the weighted samples, and the
+// matrix is applied to the measurement.
+#include "colour/SolverSupport.h"
+#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+
+#include <algorithm>
+#include <cmath>
+
+using solver::allocateArray;
+
+namespace {
+
+constexpr double kPi = 3.141592653589793;
+
+// The object's colour settings, read once per call.
+struct FitSettings {
+    double exponent;   // p of the similarity weight
+    double offset;     // c added to the cosine distance
+    float lambda;      // ridge parameter
+    bool normalised;   // database and measurement in unit-length, sigma-scaled form
+};
+
+// The database can be read for channelCount channels without leaving its arrays.
+bool databaseFits(const SpectralDatabase& db, int channelCount)
+{
+    size_t N = db.dbSampleCount;
+    size_t M = db.dbChannelCount;
+    return N > 0 && M == size_t(channelCount) && db.dbXYZ.size() >= 3 * N && db.dbChannelResponses.size() >= M * N &&
+           (db.channelStdDev.empty() || db.channelStdDev.size() >= M);
+}
+
+bool allZero(const float* channels, int count)
+{
+    for (int j = 0; j < count; ++j)
+        if (channels[j] != 0.0f)
+            return false;
+    return true;
+}
+
+// Samples are weighed in chunks: the per-sample sums of a chunk are formed
+// channel by channel over contiguous rows, then turned into weights, both
+// loops free of branches so that they vectorise. The guards are checked once
+// per chunk; when one fires, the chunk is walked again in sample order to
+// report the first offender.
+constexpr size_t kChunk = 64;
+
+struct SimilarityInput {
+    const float* responses; // M x N, channel-major
+    size_t N;
+    int M;
+    double x[kSolverMaxChannels];     // the measurement, widened
+    double scale[kSolverMaxChannels]; // sigma_j undoing the database scaling, or 1
+    double measuredSquares;           // the same for every sample
+    double exponent;
+    double offset;
+};
+
+struct ChunkSums {
+    double dot[kChunk];
+    double squares[kChunk];
+};
+
+void sumChunk(const SimilarityInput& in, size_t start, size_t count, ChunkSums& sums)
+{
+    for (size_t k = 0; k < count; ++k)
+        sums.dot[k] = sums.squares[k] = 0.0;
+    for (int j = 0; j < in.M; ++j) {
+        const float* row = in.responses + j * in.N + start;
+        const double xj = in.x[j], scale = in.scale[j];
+        for (size_t k = 0; k < count; ++k) {
+            double q = double(row[k]) * scale;
+            sums.dot[k] += q * xj;
+            sums.squares[k] += q * q;
+        }
+    }
+}
+
+double distance(const SimilarityInput& in, double dot, double product)
+{
+    return 1.0 - dot / std::sqrt(product) + in.offset;
+}
+
+// Weights of one chunk; true when a guard fires for one of its samples. The
+// exponent 2 is a product: the correctly rounded square that pow stands for,
+// without the cost of a general power.
+template <bool Squared>
+bool chunkWeights(const SimilarityInput& in, const ChunkSums& sums, size_t count, float* weights)
+{
+    bool fired = false;
+    for (size_t k = 0; k < count; ++k) {
+        double product = sums.squares[k] * in.measuredSquares;
+        double d = distance(in, sums.dot[k], product);
+        fired |= (product == 0.0) | (d == 0.0);
+        double power = Squared ? d * d : std::pow(d, in.exponent);
+        weights[k] = static_cast<float>(1.0 / power);
+    }
+    return fired;
+}
+
+void reportGuard(const SimilarityInput& in, const ChunkSums& sums, size_t count)
+{
+    for (size_t k = 0; k < count; ++k) {
+        double product = sums.squares[k] * in.measuredSquares;
+        if (product == 0.0) {
+            VLOG_INFO("QiQi x QtQt == %f, can not proceed with color calculation \n", product);
+            return;
+        }
+        if (distance(in, sums.dot[k], product) == 0.0) {
+            VLOG_INFO("di+c == 0, can not proceed with color calculation \n");
+            return;
+        }
+    }
+}
+
+// 1 / (1 - cos(angle between measurement and sample) + c)^p for every sample,
+// in double precision. sigma, when given, undoes the per-channel scaling of
+// the database (channels with sigma 0 were left unscaled). Stops at the first
+// chunk in which a guard fires.
+bool similarityWeights(const SpectralDatabase& db, const float* channels, int M, const float* sigma,
+                       const FitSettings& settings, float* weights)
+{
+    SimilarityInput in{db.dbChannelResponses.data(), db.dbSampleCount, M, {}, {}, 0.0, settings.exponent,
+                       settings.offset};
+    for (int j = 0; j < M; ++j) {
+        in.x[j] = channels[j];
+        in.measuredSquares += in.x[j] * in.x[j];
+        in.scale[j] = sigma && sigma[j] != 0.0f ? double(sigma[j]) : 1.0;
+    }
+    const bool squared = settings.exponent == 2.0;
+    ChunkSums sums;
+    for (size_t start = 0; start < in.N; start += kChunk) {
+        size_t count = std::min(kChunk, in.N - start);
+        sumChunk(in, start, count, sums);
+        bool fired = squared ? chunkWeights<true>(in, sums, count, weights + start)
+                             : chunkWeights<false>(in, sums, count, weights + start);
+        if (fired) {
+            reportGuard(in, sums, count);
+            return false;
+        }
+    }
+    return true;
+}
+
+// Scales the weights so that the largest is 1 and puts the measurement into
+// the sigma-scaled space of the database.
+void normaliseWeightsAndMeasurement(size_t N, float* weights, float* channels, int M, const float* sigma)
+{
+    double largest = 0.0;
+    for (size_t i = 0; i < N; ++i)
+        if (double(weights[i]) > largest)
+            largest = weights[i];
+    VLOG_DEBUG("Normalization - Max WW = %f \n", largest);
+    if (largest != 0.0)
+        for (size_t i = 0; i < N; ++i)
+            weights[i] = static_cast<float>(weights[i] / largest);
+    if (sigma)
+        for (int j = 0; j < M; ++j)
+            if (sigma[j] != 0.0f)
+                channels[j] /= sigma[j];
+}
+
+bool coefficientsFinite(const float* coefficients, int M)
+{
+    for (int j = 0; j < M; ++j)
+        for (int c = 0; c < 3; ++c)
+            if (!std::isfinite(coefficients[4 * j + c]))
+                return false;
+    return true;
+}
+
+void clampAndLog(float* xyz)
+{
+    for (int c = 0; c < 3; ++c)
+        if (xyz[c] < 0.0f)
+            xyz[c] = 0.0f;
+    VLOG_DEBUG("Color: X=%f(%f) Y=%f(%f) Z=%f(%f) \n", double(xyz[0]), xyz[0] / kPi, double(xyz[1]), xyz[1] / kPi,
+               double(xyz[2]), xyz[2] / kPi);
+}
+
+} // namespace
+
+bool VantishPlugIn::colourCalculationDynamic(float* channels, float* xyz, int channelCount)
+{
+    DatabaseSnapshot snapshot = snapshotDatabase();
+    if (!snapshot.db)
+        return false;
+    return colourCalculationDynamic(*snapshot.db, channels, xyz, channelCount);
+}
+
+bool VantishPlugIn::colourCalculationDynamic(const SpectralDatabase& db, float* channels, float* xyz,
+                                             int channelCount)
+{
+    if (!channels || !xyz || channelCount < 1)
+        return false;
+    // No fit without a database made for this many channels.
+    if (!databaseFits(db, channelCount))
+        return false;
+    if (allZero(channels, channelCount)) {
+        xyz[0] = xyz[1] = xyz[2] = 0.0f;
+        VLOG_DEBUG("All channels are zero. Take a shortcut");
+        clampAndLog(xyz);
+        return true;
+    }
+
+    const FitSettings settings{weightExponent.load(), weightOffset.load(), lambda.load(), lambdaConfigured.load() != 0};
+    const int M = channelCount;
+    const size_t N = db.dbSampleCount;
+    const float* sigma = settings.normalised ? db.stdDevOrNull() : nullptr;
+    if (settings.normalised)
+        normalizedByEuklidNorm(channels, 1, M);
+
+    auto weights = allocateArray<float>(N);
+    auto coefficients = allocateArray<float>(size_t(4) * M);
+    auto transform = allocateArray<float>(size_t(3) * M);
+    bool fitted = false;
+    if (M > kSolverMaxChannels) {
+        VLOG_ERROR("Color fit supports at most %d channels, got %d \n", kSolverMaxChannels, M);
+    } else if (!weights || !coefficients || !transform) {
+        VLOG_ERROR("Color calculation is out of memory \n");
+    } else if (similarityWeights(db, channels, M, sigma, settings, weights.get())) {
+        if (settings.normalised)
+            normaliseWeightsAndMeasurement(N, weights.get(), channels, M, sigma);
+        hybridSolveWithRegularization(int(N), M, db.dbXYZ.data(), weights.get(), db.dbChannelResponses.data(),
+                                      coefficients.get(), settings.lambda);
+        // A failed solve leaves NaN; a colour is never made from it.
+        fitted = coefficientsFinite(coefficients.get(), M);
+        if (!fitted)
+            VLOG_INFO("Color fit failed, can not proceed with color calculation \n");
+    }
+    if (fitted) {
+        for (int c = 0; c < 3; ++c)
+            for (int j = 0; j < M; ++j)
+                transform[size_t(c) * M + j] = coefficients[size_t(4) * j + c];
+        multiplyMatrices(transform.get(), 3, unsigned(M), channels, unsigned(M), 1, xyz);
+    }
+    clampAndLog(xyz);
+    return fitted;
+}

@@ -1,0 +1,114 @@
+#include "host/Unit.h"
+
+#include <VantishPlatform/DeviceState.h>
+#include <VantishPlatform/HIDHost.h>
+#include <VantishPlatform/Paths.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <functional>
+#include <map>
+#include <set>
+
+namespace fs = std::filesystem;
+
+namespace host {
+
+namespace {
+
+void setProperties(const nlohmann::json& properties, const fs::path& folder, const std::string& where,
+                   const std::function<void(CFStringRef, CFTypeRef)>& set)
+{
+    for (const auto& [key, value] : properties.items()) {
+        CFStringRef cfKey = CFStringCreateWithCString(nullptr, key.c_str(), kCFStringEncodingUTF8);
+        CFTypeRef cfValue = createPropertyValue(value, folder, where + "." + key);
+        set(cfKey, cfValue);
+        CFRelease(cfValue);
+        CFRelease(cfKey);
+    }
+}
+
+// Entries are created parents first; an entry naming a parent that is not
+// described hangs from the root.
+void createRegistry(const DeviceDescription& d)
+{
+    VPRegistryReset();
+    std::set<uint64_t> described;
+    for (const auto& e : d.registry)
+        described.insert(e.id);
+    std::set<uint64_t> created;
+    std::map<uint64_t, io_registry_entry_t> handles;
+    while (created.size() < d.registry.size()) {
+        bool progress = false;
+        for (size_t i = 0; i < d.registry.size(); ++i) {
+            const auto& e = d.registry[i];
+            if (created.count(e.id))
+                continue;
+            const bool parentReady = e.parent == 0 || !described.count(e.parent) || created.count(e.parent);
+            if (!parentReady)
+                continue;
+            const io_registry_entry_t parent = handles.count(e.parent) ? handles[e.parent] : 0;
+            const io_registry_entry_t entry = VPRegistryCreateEntry(e.id, parent);
+            handles[e.id] = entry;
+            setProperties(e.properties, d.folder(), "registry[" + std::to_string(i) + "].properties",
+                          [&](CFStringRef k, CFTypeRef v) { VPRegistrySetProperty(entry, k, v); });
+            created.insert(e.id);
+            progress = true;
+        }
+        if (!progress)
+            throw DescriptionError(d.file.string() + ": registry: the parent links form a cycle");
+    }
+}
+
+} // namespace
+
+Unit::Unit(const DeviceDescription& description) : description_(description)
+{
+    createRegistry(description_);
+
+    service_ = VPServiceCreate(description_.registryID);
+    for (const auto& [page, usage] : description_.usages)
+        VPServiceAddUsage(service_, page, usage);
+    setProperties(description_.serviceProperties, description_.folder(), "service.properties",
+                  [&](CFStringRef k, CFTypeRef v) { VPServicePublishProperty(service_, k, v); });
+
+    VPQVTSetStoreDirectory(description_.factoryStore ? description_.factoryStore->string() : std::string());
+    VPSetBootArgs(description_.bootArgs);
+    VPTessaryReset();
+    VPTessarySetProductType(description_.productType);
+    setProperties(description_.answers, description_.folder(), "deviceInfo",
+                  [](CFStringRef k, CFTypeRef v) { VPTessarySetAnswer(k, v); });
+}
+
+Unit::~Unit()
+{
+    if (service_)
+        CFRelease(service_);
+}
+
+CFTypeRef Unit::copyDriverProperty(const char* key) const
+{
+    CFStringRef cfKey = CFStringCreateWithCString(nullptr, key, kCFStringEncodingUTF8);
+    CFTypeRef value = VPServiceCopyReceivedProperty(service_, cfKey);
+    CFRelease(cfKey);
+    return value;
+}
+
+void mapDevicePaths(const std::string& bundleFolder, const std::string& stateFolder)
+{
+    std::error_code ec;
+    fs::create_directories(stateFolder, ec);
+    VPSetPathRoot("/System/Library/HIDPlugins", fs::absolute(bundleFolder).parent_path().string());
+    VPSetPathRoot("/var/mobile", fs::absolute(stateFolder).string());
+}
+
+std::string defaultStateFolder()
+{
+    if (const char* xdg = std::getenv("XDG_STATE_HOME"); xdg && *xdg)
+        return (fs::path(xdg) / "vantish").string();
+    if (const char* home = std::getenv("HOME"); home && *home)
+        return (fs::path(home) / ".local" / "state" / "vantish").string();
+    return (fs::temp_directory_path() / "vantish-state").string();
+}
+
+} // namespace host

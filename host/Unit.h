@@ -1,0 +1,39 @@
+// A described unit made real on the platform stand-in: its registry entries,
+// its HID service with the driver's properties, its factory-data store, boot
+// arguments and device-information answers. One unit exists at a time (the
+// registry and the store are process-wide).
+#pragma once
+
+#include "host/DeviceDescription.h"
+
+#include <IOKit/hid/IOHIDService.h>
+
+#include <string>
+
+namespace host {
+
+class Unit {
+public:
+    explicit Unit(const DeviceDescription& description);
+    ~Unit();
+    Unit(const Unit&) = delete;
+    Unit& operator=(const Unit&) = delete;
+
+    const DeviceDescription& description() const { return description_; }
+    IOHIDServiceRef service() const { return service_; }
+
+    // What the plug-in handed the driver under `key` (retained), or null.
+    CFTypeRef copyDriverProperty(const char* key) const;
+
+private:
+    DeviceDescription description_;
+    IOHIDServiceRef service_ = nullptr;
+};
+
+// Maps the device's fixed paths: the system folder onto the bundle's parent,
+// the state folder onto `stateFolder` (created when missing).
+void mapDevicePaths(const std::string& bundleFolder, const std::string& stateFolder);
+// The user's state folder for caches ($XDG_STATE_HOME/vantish or ~/.local/state/vantish).
+std::string defaultStateFolder();
+
+} // namespace host

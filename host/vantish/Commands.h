@@ -1,0 +1,27 @@
+// The vantish command's subcommands. Each registers its options on the CLI11
+// app and returns the exit code when it runs.
+#pragma once
+
+#include <CLI/CLI.hpp>
+
+#include <functional>
+#include <string>
+
+namespace vantish {
+
+// Options every subcommand shares.
+struct CommonOptions {
+    std::string bundle;   // the plug-in bundle folder
+    std::string state;    // the state folder (per-chip caches)
+    std::string logLevel; // default, info, debug, error, off
+};
+
+// Registers a subcommand; `run` is called when it was chosen.
+using Runner = std::function<int()>;
+Runner addOpenCommand(CLI::App& app, const CommonOptions& common);
+Runner addRunCommand(CLI::App& app, const CommonOptions& common);
+
+// The built-in sample device used when no device is named.
+std::string defaultDevice();
+
+} // namespace vantish

@@ -1,0 +1,121 @@
+// vantish open DEVICE: match and open the plug-in on a unit, wait for its
+// calibration bring-up, and report what it read, logged and handed the driver.
+#include "host/vantish/Commands.h"
+
+#include "host/Bundle.h"
+#include "host/DataFolder.h"
+#include "host/PlugInSession.h"
+#include "host/Unit.h"
+
+#include <VantishPlatform/LogControl.h>
+
+#include <iostream>
+
+namespace vantish {
+
+namespace {
+
+struct OpenOptions {
+    std::string device;
+};
+
+const char* levelTag(os_log_type_t type)
+{
+    switch (type) {
+    case OS_LOG_TYPE_ERROR:
+    case OS_LOG_TYPE_FAULT:
+        return "error";
+    case OS_LOG_TYPE_INFO:
+        return "info";
+    case OS_LOG_TYPE_DEBUG:
+        return "debug";
+    default:
+        return "default";
+    }
+}
+
+void printLog(const std::vector<VPLogLine>& lines)
+{
+    for (const auto& line : lines) {
+        std::string message = line.message;
+        while (!message.empty() && (message.back() == '\n' || message.back() == ' '))
+            message.pop_back();
+        std::cout << "    [" << levelTag(line.type) << "] " << message << "\n";
+    }
+}
+
+void printDriverProperty(const host::Unit& unit, const char* key)
+{
+    CFTypeRef value = unit.copyDriverProperty(key);
+    if (!value) {
+        std::cout << "    " << key << ": not set\n";
+        return;
+    }
+    if (CFGetTypeID(value) == CFDataGetTypeID()) {
+        std::cout << "    " << key << ": " << CFDataGetLength(static_cast<CFDataRef>(value)) << " bytes\n";
+    } else {
+        CFStringRef description = CFCopyDescription(value);
+        std::cout << "    " << key << ": " << CFStringGetCStringPtr(description, kCFStringEncodingUTF8) << "\n";
+        CFRelease(description);
+    }
+    CFRelease(value);
+}
+
+int runOpen(const CommonOptions& common, const OpenOptions& options)
+{
+    try {
+        const std::string devicePath = options.device.empty() ? defaultDevice() : options.device;
+        host::DeviceDescription description = host::loadDeviceDescription(devicePath);
+        host::Bundle bundle(common.bundle);
+        host::mapDevicePaths(common.bundle, common.state);
+        host::Unit unit(description);
+
+        VPLogSetEcho(false);
+        VPLogSetLevel(VPLogLevel::Info);
+        VPLogStartCapture();
+
+        std::cout << "Bundle  " << bundle.folder() << " (factory " << bundle.factoryName() << ")\n";
+        std::cout << "Unit    " << description.name;
+        if (!description.summary.empty())
+            std::cout << " - " << description.summary;
+        std::cout << "\n\n";
+
+        host::PlugInSession session(bundle, unit);
+        const SInt32 score = session.match();
+        std::cout << "match   score " << score << (score > 0 ? " (attached)" : " (declined)") << "\n";
+        printLog(VPLogTakeCaptured());
+        if (score <= 0)
+            return 1;
+
+        session.open();
+        std::cout << "open    configuration read from the service, device tree and device information\n";
+        printLog(VPLogTakeCaptured());
+
+        session.waitForQueuedWork();
+        std::cout << "bring-up\n";
+        printLog(VPLogTakeCaptured());
+
+        std::cout << "driver received\n";
+        printDriverProperty(unit, "ALSCalibrationData");
+        printDriverProperty(unit, "ALSColorCalibration");
+        printDriverProperty(unit, "crgb");
+        VPLogStopCapture();
+        return 0;
+    } catch (const std::exception& e) {
+        std::cerr << "vantish: " << e.what() << "\n";
+        return 2;
+    }
+}
+
+} // namespace
+
+std::string defaultDevice() { return (host::dataFolder() / "devices" / "basic-rgbc" / "device.json").string(); }
+
+Runner addOpenCommand(CLI::App& app, const CommonOptions& common)
+{
+    auto options = std::make_shared<OpenOptions>();
+    app.add_option("device", options->device, "Device description (JSON); the built-in sample unit when omitted");
+    return [&common, options] { return runOpen(common, *options); };
+}
+
+} // namespace vantish

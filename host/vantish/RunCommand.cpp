@@ -1,0 +1,244 @@
+// vantish run DEVICE: feed light samples through the plug-in on a unit, as the
+// driver and the event system would, and print the colour clients receive.
+#include "host/vantish/Commands.h"
+#include "host/vantish/OpenedUnit.h"
+
+#include "host/DriverSample.h"
+#include "host/EventInput.h"
+#include "spectra/Colorimetry.h"
+
+#include <fstream>
+#include <iomanip>
+#include <iostream>
+#include <sstream>
+
+namespace vantish {
+
+namespace {
+
+struct RunOptions {
+    std::string device;
+    std::string events = "-";
+    std::string format = "csv";
+    std::string inputFormat = "auto";
+    std::vector<std::string> sets;
+};
+
+// The colour of one event as clients receive it.
+struct Result {
+    std::string index; // the sample's number, or "copy"
+    double lux = 0, X = 0, Y = 0, Z = 0;
+    long colorSpace = 0;
+    bool spike = false;
+};
+
+Result readResult(IOHIDEventRef event, const ALSSampleRecord& input)
+{
+    Result r;
+    r.lux = IOHIDEventGetFloatValue(event, kIOHIDEventFieldAmbientLightSensorLevel);
+    r.colorSpace = IOHIDEventGetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace);
+    r.X = IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent0);
+    r.Y = IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent1);
+    r.Z = IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent2);
+    if (input.xyzInRecord) {
+        // The colour went into the driver's record instead of the event's fields.
+        if (auto xyz = host::readXYZResult(event)) {
+            r.X = (*xyz)[0];
+            r.Y = (*xyz)[1];
+            r.Z = (*xyz)[2];
+        }
+    }
+    r.spike = input.lux > 0 && r.lux == 0 && r.X == 0 && r.Y == 0 && r.Z == 0;
+    return r;
+}
+
+class Printer {
+public:
+    Printer(std::ostream& out, bool json) : out_(out), json_(json)
+    {
+        if (!json_)
+            out_ << "index,lux,X,Y,Z,x,y,u_prime,v_prime,cct,colorSpace,spike\n";
+    }
+    void print(const Result& r)
+    {
+        const spectra::Xy xy = spectra::chromaticity({r.X, r.Y, r.Z});
+        const bool hasColour = r.X + r.Y + r.Z > 0;
+        const spectra::Uv uv = spectra::uvPrime(xy);
+        const auto cct = hasColour ? spectra::correlatedColourTemperature(xy) : std::nullopt;
+        std::ostringstream line;
+        line << std::setprecision(6);
+        if (json_) {
+            nlohmann::json j = {{"index", r.index}, {"lux", r.lux}, {"X", r.X}, {"Y", r.Y}, {"Z", r.Z},
+                                {"colorSpace", r.colorSpace}, {"spike", r.spike}};
+            if (hasColour) {
+                j["x"] = xy.x;
+                j["y"] = xy.y;
+                j["u_prime"] = uv.u;
+                j["v_prime"] = uv.v;
+            }
+            j["cct"] = cct ? nlohmann::json(*cct) : nlohmann::json(nullptr);
+            out_ << j.dump() << "\n";
+            return;
+        }
+        line << r.index << ',' << r.lux << ',' << r.X << ',' << r.Y << ',' << r.Z << ',';
+        if (hasColour)
+            line << std::fixed << std::setprecision(4) << xy.x << ',' << xy.y << ',' << uv.u << ',' << uv.v << ',';
+        else
+            line << ",,,,";
+        if (cct)
+            line << std::fixed << std::setprecision(0) << *cct;
+        line << ',' << r.colorSpace << ',' << (r.spike ? 1 : 0);
+        out_ << line.str() << "\n";
+    }
+
+private:
+    std::ostream& out_;
+    bool json_;
+};
+
+bool setProperty(OpenedUnit& opened, const std::string& key, const nlohmann::json& value, std::string& error)
+{
+    try {
+        CFTypeRef cfValue = clientPropertyValue(value);
+        CFStringRef cfKey = CFStringCreateWithCString(nullptr, key.c_str(), kCFStringEncodingUTF8);
+        opened.session->setProperty(cfKey, cfValue);
+        CFRelease(cfKey);
+        CFRelease(cfValue);
+        return true;
+    } catch (const std::exception& e) {
+        error = e.what();
+        return false;
+    }
+}
+
+int runEvents(const CommonOptions& common, const RunOptions& options)
+{
+    applyLogOption(common);
+    std::unique_ptr<OpenedUnit> opened;
+    try {
+        opened = openUnit(common, options.device);
+    } catch (const std::exception& e) {
+        std::cerr << "vantish: " << e.what() << "\n";
+        return 2;
+    }
+
+    for (const auto& assignment : options.sets) {
+        auto parsed = host::parseAssignment(assignment);
+        std::string error;
+        if (!parsed) {
+            std::cerr << "vantish: --set " << assignment << ": expected KEY=VALUE\n";
+            return 2;
+        }
+        if (!setProperty(*opened, parsed->first, parsed->second, error)) {
+            std::cerr << "vantish: --set " << assignment << ": " << error << "\n";
+            return 2;
+        }
+    }
+
+    std::ifstream file;
+    std::istream* in = &std::cin;
+    const std::string source = options.events == "-" ? "<stdin>" : options.events;
+    if (options.events != "-") {
+        file.open(options.events);
+        if (!file) {
+            std::cerr << "vantish: cannot read " << options.events << "\n";
+            return 2;
+        }
+        in = &file;
+    }
+    host::InputFormat format = host::InputFormat::Csv;
+    if (options.inputFormat == "jsonl" ||
+        (options.inputFormat == "auto" && (source.ends_with(".jsonl") || source.ends_with(".json"))))
+        format = host::InputFormat::JsonLines;
+
+    Printer printer(std::cout, options.format == "jsonl");
+    host::EventReader reader(*in, format, opened->channelCount());
+    std::vector<host::InputError> errors;
+    size_t samples = 0, failed = 0;
+    IOHIDEventRef lastDriverEvent = nullptr; // the service's current event, for copies
+    ALSSampleRecord lastRecord;
+    auto reportErrors = [&] {
+        for (const auto& e : errors)
+            std::cerr << "vantish: " << e.describe(source) << "\n";
+        failed += errors.size();
+        errors.clear();
+    };
+
+    while (auto row = reader.next(errors)) {
+        reportErrors();
+        switch (row->kind) {
+        case host::InputRow::Kind::SetProperty: {
+            std::string error;
+            if (!setProperty(*opened, row->key, row->value, error))
+                errors.push_back({row->line, row->key, error});
+            break;
+        }
+        case host::InputRow::Kind::CopyEvent: {
+            if (!lastDriverEvent) {
+                errors.push_back({row->line, "", "nothing to copy before the first sample"});
+                break;
+            }
+            IOHIDEventRef copy = IOHIDEventCreateCopy(kCFAllocatorDefault, lastDriverEvent);
+            opened->session->copyEvent(copy);
+            Result r = readResult(copy, lastRecord);
+            r.index = "copy";
+            printer.print(r);
+            CFRelease(copy);
+            break;
+        }
+        case host::InputRow::Kind::Sample: {
+            const uint64_t ticks = uint64_t(row->timeSeconds * 1e9);
+            IOHIDEventRef event = host::createALSEvent(row->record, ticks);
+            if (lastDriverEvent)
+                CFRelease(lastDriverEvent);
+            lastDriverEvent = IOHIDEventCreateCopy(kCFAllocatorDefault, event);
+            lastRecord = row->record;
+            opened->session->filter(event);
+            Result r = readResult(event, row->record);
+            r.index = std::to_string(samples++);
+            printer.print(r);
+            CFRelease(event);
+            break;
+        }
+        }
+        reportErrors();
+    }
+    reportErrors();
+    if (lastDriverEvent)
+        CFRelease(lastDriverEvent);
+    std::cout.flush();
+    if (samples == 0 && failed > 0)
+        return 1; // nothing could be done
+    return 0;
+}
+
+} // namespace
+
+Runner addRunCommand(CLI::App& app, const CommonOptions& common)
+{
+    auto options = std::make_shared<RunOptions>();
+    app.add_option("device", options->device, "Device description (JSON)")->required();
+    app.add_option("--events", options->events,
+                   "Samples to feed: a CSV file with a header, JSON lines (.jsonl), or - for standard input")
+        ->capture_default_str();
+    app.add_option("--input-format", options->inputFormat, "Input format: auto (by file name), csv or jsonl")
+        ->check(CLI::IsMember({"auto", "csv", "jsonl"}))
+        ->capture_default_str();
+    app.add_option("--format", options->format, "Output format: csv or jsonl")
+        ->check(CLI::IsMember({"csv", "jsonl"}))
+        ->capture_default_str();
+    app.add_option("--set", options->sets,
+                   "Set a client property before the first sample, KEY=VALUE with VALUE in JSON\n"
+                   "(RGBCOverride=1, RGBCOverride=[100,200,300,400], ChromaticityOverride=[0.3127,0.329,100],\n"
+                   "ColorAlgoLambda=0.05, ChannelRatioMitigationType=3, RebuildVelderDB=true)");
+    app.footer("Sample fields: c0..c5, lux, rawLux, sampleChannelCount, sampleOrientation, status, nits,\n"
+               "integrationTime, reportInterval, gain (a multiplier), cct, timestamp, subsamples, mode,\n"
+               "xTalk0..xTalk4, xyzInRecord, xyzSensorX/Y/Z, filteredLux, filteredLuxValid, ts (seconds).\n"
+               "Absent fields take defaults (see docs/usage.md). Lines '!set KEY=VALUE' and '!copy' (CSV) or\n"
+               "{\"set\": {KEY: VALUE}} and {\"copy\": true} (JSON lines) set client properties and copy the\n"
+               "current event. Output: index, lux, X, Y, Z as clients receive them, chromaticity x, y, u', v',\n"
+               "correlated colour temperature, colour space, and whether the sample was a light spike.");
+    return [&common, options] { return runEvents(common, *options); };
+}
+
+} // namespace vantish

@@ -1,0 +1,50 @@
+#include "lightdb/LDBM.h"
+#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+
+#include <new>
+
+// Works on the caller's private `db` only; the caller publishes it once it is
+// complete, so nothing here is ever seen half-written.
+bool VantishPlugIn::processCachedDB(int channelCount, BigDBType type, SpectralDatabase& db)
+{
+    const int cacheOrientation = int(orientation.load());
+    bool valid = false;
+    if (LDBMInitialize(cacheOrientation, &db.dbInfo, &valid, type, smallDBVersion.load()) != 0) {
+        VLOG_DEFAULT("Database not found!\n");
+        return false;
+    }
+
+    const uint32_t sources = uint32_t(db.dbInfo.sources); // never negative once LDBMInitialize succeeded
+    VLOG_DEFAULT("nSources: %u nChannels: %d\n", sources, channelCount);
+    const uint32_t rows = channelCount > 0 ? uint32_t(channelCount) : 0;
+    try {
+        db.allocate(sources, rows);
+    } catch (const std::bad_alloc&) {
+        db = SpectralDatabase{};
+        VLOG_ERROR("Cannot allocate a database of %u sources\n", sources);
+        return false;
+    }
+
+    // A build fills the arrays from zero, so a rejected cache leaves nothing behind.
+    auto rebuild = [&] {
+        db.allocate(sources, rows);
+        return false;
+    };
+    if (!valid) {
+        VLOG_DEFAULT("Cached DB not found. Recreating");
+        return false;
+    }
+    if (LDBMParseSmallDB(cacheOrientation, &db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(), int(rows)) !=
+        0) {
+        VLOG_DEFAULT("Cached DB corrupted. Recreating");
+        return rebuild();
+    }
+    if (db.dbInfo.chipID != chipId.load()) {
+        VLOG_DEFAULT("Found cached DB for different chip ID. Recreating");
+        return rebuild();
+    }
+    VLOG_DEFAULT("Matching cached DB found");
+    algoVersion.store(uint8_t(db.dbInfo.algo));
+    return true;
+}

@@ -1,0 +1,203 @@
+// The per-event filter: every ALS event of the service passes through here.
+// It applies the client overrides, rejects light spikes, estimates the colour
+// of the sample against the per-chip database and writes it back into the
+// event (or into the driver's record), then hands the event to the sample log.
+//
+// Called for every sample on the host's thread: nothing here allocates, and
+// one snapshot of the database serves the whole call, however calibration
+// replaces it meanwhile.
+#include "plugin/ALSSampleRecord.h"
+#include "plugin/ChromaticityOverride.h"
+#include "plugin/Log.h"
+#include "plugin/SpikeDetector.h"
+#include "plugin/VantishPlugIn.h"
+
+#include <array>
+#include <cmath>
+#include <span>
+
+namespace {
+
+using XYZ = std::array<float, 3>;
+
+constexpr uint32_t kMaxChannels = 6;
+constexpr double kComparisonThreshold = 0.005; // 0.5 % of our own value
+// A driver that sends short records sends them all the time: log the first
+// one and then every 1000th.
+constexpr uint64_t kShortRecordLogInterval = 1000;
+
+bool isALSEvent(IOHIDEventRef event)
+{
+    return event && IOHIDEventGetType(event) == kIOHIDEventTypeAmbientLightSensor;
+}
+
+void writeEventXYZ(IOHIDEventRef event, const XYZ& xyz)
+{
+    IOHIDEventSetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent0, xyz[0]);
+    IOHIDEventSetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent1, xyz[1]);
+    IOHIDEventSetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent2, xyz[2]);
+    IOHIDEventSetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace, 1);
+}
+
+void reportShortRecord(VantishPlugIn& plugin, size_t length)
+{
+    const uint64_t count = plugin.shortSampleRecords.fetch_add(1) + 1;
+    if (count % kShortRecordLogInterval == 1)
+        VLOG_ERROR("Sample record of %lu bytes is shorter than %lu bytes, event passed unchanged (%llu so far)\n",
+                   (unsigned long) length, (unsigned long) ALSSampleRecord::kSize, (unsigned long long) count);
+}
+
+// A spike zeroes the level now and the colour on the way out.
+bool rejectSpike(IOHIDEventRef event, const ALSSampleRecord& record, const SpikeSettings& settings)
+{
+    const SpikeResult spike = detectSpike(record, settings);
+    if (!spike.spike)
+        return false;
+    VLOG_INFO("ALS spike detected (type = %d). Lux = %f, Channel ratio = %f", int(settings.mitigationType),
+              double(record.lux), double(spike.ratio));
+    VLOG_DEBUG("ALS spike is detected -> setting zero lux and zero color.");
+    IOHIDEventSetFloatValue(event, kIOHIDEventFieldAmbientLightSensorLevel, 0.0);
+    return true;
+}
+
+// Replaces the colour input and the record's channels by the client's values
+// and shows them in the event: in the driver's record and the raw channel fields.
+void applyRGBCOverride(VantishPlugIn& plugin, IOHIDEventRef event, ALSSampleRecord& record,
+                       std::span<uint8_t> recordBytes, std::array<float, kMaxChannels>& channel,
+                       uint32_t channelCount, uint32_t skip)
+{
+    std::array<uint32_t, kMaxChannels> values{};
+    for (size_t i = 0; i < values.size(); ++i)
+        values[i] = plugin.rgbcOverride[i].load();
+    for (uint32_t i = 0; i < channelCount; ++i) {
+        channel[i] = float(values[i]);
+        record.channelValues[skip + i] = float(values[i]);
+    }
+    ALSSampleRecord::writeChannelValues(recordBytes, record.channelValues);
+    IOHIDEventSetFloatValue(event, kIOHIDEventFieldAmbientLightSensorRawChannel0, values[0]);
+    IOHIDEventSetFloatValue(event, kIOHIDEventFieldAmbientLightSensorRawChannel1, values[1]);
+    IOHIDEventSetFloatValue(event, kIOHIDEventFieldAmbientLightSensorRawChannel2, values[2]);
+    IOHIDEventSetFloatValue(event, kIOHIDEventFieldAmbientLightSensorRawChannel3, values[3]);
+}
+
+void logSample(const ALSSampleRecord& r, const XYZ& xyz)
+{
+    const auto& c = r.channelValues;
+    VLOG_DEBUG("lux=%f status=%d nChannels=%d orientation=%d integrationTime=%u reportInterval=%u gain=%f "
+               "XYZ=[%f;%f;%f] Channels=[%f;%f;%f;%f;%f;%f]",
+               double(r.lux), int(r.status), int(r.sampleChannelCount), int(r.sampleOrientation), r.integrationTime,
+               r.reportInterval, double(float(r.gain) / 65536.0f), double(xyz[0]), double(xyz[1]), double(xyz[2]),
+               double(c[0]), double(c[1]), double(c[2]), double(c[3]), double(c[4]), double(c[5]));
+}
+
+// The colour fit gives a direction; the record's lux gives the magnitude.
+XYZ scaleToLux(const XYZ& xyz, float lux)
+{
+    if (!(xyz[1] > 0.0f))
+        return {};
+    const float k = lux / xyz[1];
+    return {xyz[0] * k, lux, k * xyz[2]};
+}
+
+// Our XYZ against the one the sensor side computed, for X and Z.
+void logComparisonWithSensor(const ALSSampleRecord& r, const XYZ& xyz)
+{
+    VLOG_DEBUG("[ColorCalc] ts=%u XYZAP=[%f %f %f] XYZAOP=[%f %f %f]", r.timestamp, double(xyz[0]), double(xyz[1]),
+               double(xyz[2]), double(r.xyzSensor[0]), double(r.xyzSensor[1]), double(r.xyzSensor[2]));
+    for (int i : {0, 2}) {
+        const double ours = xyz[i];
+        const double sensor = r.xyzSensor[i];
+        const double diff = std::fabs(ours - sensor);
+        const double threshold = ours * kComparisonThreshold;
+        VLOG_DEBUG("[ColorCalc] diff(XYZAP[%d], XYZAOP[%d]) = diff(%f, %f) = %f treshholdValue(%.2f%%) = %f "
+                   "isBelowTreshhold = %s",
+                   i, i, ours, sensor, diff, kComparisonThreshold * 100.0, threshold,
+                   threshold >= diff ? "YES" : "!!NO!!");
+    }
+}
+
+// The colour of one sample, scaled to its lux; zero when the sample is a spike
+// or the channel layout cannot be matched with the database. May change the
+// record (clamped channels, client channels) and the event (level, raw fields).
+XYZ sampleColour(VantishPlugIn& plugin, IOHIDEventRef event, const SpectralDatabase& db, ALSSampleRecord& record,
+                 std::span<uint8_t> recordBytes)
+{
+    const uint32_t sensorChannels = plugin.numberOfChannels.load();
+    if (sensorChannels < 4 || sensorChannels > kMaxChannels) {
+        VLOG_ERROR("Unknown number of channels (%d) \n", int(sensorChannels));
+        return {};
+    }
+
+    const uint32_t sensorType = plugin.sensorType.load();
+    const SpikeSettings spikeSettings{plugin.channelRatioMitigation.load() != 0, plugin.mitigationType.load(),
+                                      plugin.chipType.load(), sensorType};
+    if (rejectSpike(event, record, spikeSettings))
+        return {};
+
+    // The database's channels are the sensor's last ones; a database with more
+    // channels than the sensor delivers cannot be fed.
+    const uint32_t dbChannels = db.dbChannelCount;
+    if (dbChannels < 1 || dbChannels > sensorChannels) {
+        VLOG_ERROR("Unsupported database channel count (%u) for %u sensor channels \n", dbChannels, sensorChannels);
+        return {};
+    }
+    const uint32_t skip = sensorChannels == kMaxChannels ? kMaxChannels - dbChannels : 0;
+
+    for (float& value : record.channelValues)
+        value = value < 0.0f ? 0.0f : value;
+    std::array<float, kMaxChannels> channel{};
+    for (uint32_t i = 0; i < dbChannels; ++i)
+        channel[i] = record.channelValues[skip + i];
+
+    if (plugin.rgbcOverrideActive.load())
+        applyRGBCOverride(plugin, event, record, recordBytes, channel, dbChannels, skip);
+
+    XYZ xyz{};
+    plugin.colourCalculationDynamic(db, channel.data(), xyz.data(), int(dbChannels));
+    if (sensorType != eALSSensorTypeVD6287)
+        logSample(record, xyz);
+
+    xyz = scaleToLux(xyz, record.lux);
+    if (record.xyzInRecord)
+        logComparisonWithSensor(record, xyz);
+    return xyz;
+}
+
+void filterALSEvent(VantishPlugIn& plugin, IOHIDEventRef event)
+{
+    if (const auto override = ChromaticityOverride::active(plugin)) {
+        applyChromaticityOverride(event, *override);
+        return;
+    }
+
+    const std::span<uint8_t> recordBytes = sampleRecordBytes(event);
+    if (recordBytes.empty())
+        return;
+    auto record = ALSSampleRecord::decode(recordBytes);
+    if (!record) {
+        reportShortRecord(plugin, recordBytes.size());
+        return;
+    }
+
+    const VantishPlugIn::DatabaseSnapshot snapshot = plugin.snapshotDatabase();
+    if (!snapshot.ready || !snapshot.db)
+        return;
+
+    const XYZ xyz = sampleColour(plugin, event, *snapshot.db, *record, recordBytes);
+    for (size_t i = 0; i < xyz.size(); ++i)
+        plugin.lastXYZ[i].store(xyz[i]);
+    if (record->xyzInRecord)
+        ALSSampleRecord::writeXYZResult(recordBytes, xyz);
+    else
+        writeEventXYZ(event, xyz);
+}
+
+} // namespace
+
+IOHIDEventRef VantishPlugIn::filter(IOHIDEventRef event, bool isCopyEvent)
+{
+    if (isALSEvent(event))
+        filterALSEvent(*this, event);
+    logALSSample(event, isCopyEvent);
+    return event;
+}

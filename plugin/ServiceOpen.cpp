@@ -1,0 +1,185 @@
+// Opening the plug-in on a service: configuration from the service's
+// properties, the device tree and device information, then calibration
+// bring-up queued on the high-priority global queue.
+#include "plugin/LittleEndian.h"
+#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+
+#include <Tessary/Tessary.h>
+
+#include <optional>
+#include <span>
+
+namespace {
+
+bool isNumber(CFTypeRef value) { return value && CFGetTypeID(value) == CFNumberGetTypeID(); }
+bool isData(CFTypeRef value) { return value && CFGetTypeID(value) == CFDataGetTypeID(); }
+
+std::span<const uint8_t> bytesOf(CFTypeRef data)
+{
+    CFDataRef d = static_cast<CFDataRef>(data);
+    return {CFDataGetBytePtr(d), size_t(CFDataGetLength(d))};
+}
+
+// A device-tree property found on the entry or one of its ancestors (retained), or null.
+CFTypeRef copyDeviceTreeProperty(io_registry_entry_t entry, CFStringRef key)
+{
+    return IORegistryEntrySearchCFProperty(entry, kIOServicePlane, key, kCFAllocatorDefault,
+                                           kIORegistryIterateRecursively | kIORegistryIterateParents);
+}
+
+// A service property read as int, or nothing when absent or not a number.
+std::optional<int> serviceInt(IOHIDServiceRef service, CFStringRef key)
+{
+    CFTypeRef value = IOHIDServiceGetProperty(service, key);
+    int result = 0;
+    if (!isNumber(value))
+        return std::nullopt;
+    CFNumberGetValue(static_cast<CFNumberRef>(value), kCFNumberIntType, &result);
+    return result;
+}
+
+// The device-information answer for `question` compared with `expected`.
+bool answerEquals(CFTypeRef answer, CFStringRef expected)
+{
+    return answer && CFGetTypeID(answer) == CFStringGetTypeID() && CFEqual(answer, expected);
+}
+
+} // namespace
+
+void VantishPlugIn::open(IOHIDServiceRef openedService, IOOptionBits options)
+{
+    (void) options;
+
+    // 1. Which device-tree name the driver matched on.
+    if (CFTypeRef matched = IOHIDServiceGetProperty(openedService, CFSTR("IONameMatched"))) {
+        if (os_log_type_enabled(vantishLog(), OS_LOG_TYPE_INFO)) {
+            CFStringRef description = CFCopyDescription(matched);
+            VLOG_INFO("IONameMatched=%{public}s \n", CFStringGetCStringPtr(description, kCFStringEncodingUTF8));
+            CFRelease(description);
+        }
+    } else {
+        VLOG_INFO("Unknown IONameMatched\n");
+    }
+
+    // 2. Configuration members start afresh.
+    orientation = 1;
+    service = openedService;
+    algoVersion = 0;
+    smallDBVersion = 1.1f;
+    setDbReady(false);
+    numberOfChannels = 0;
+    dbChannelCount = 0;
+    spectrumSampleCount = 0;
+    weightExponent = 2.0f;
+    weightOffset = 0.00001f;
+    channelRatioMitigation = 0;
+    mitigationType = 0;
+    chipType = 0;
+    deviceColor = 0;
+    isDravikOS = 0;
+    qvtRetryCount = 0;
+
+    // 3. Device information.
+    if (CFTypeRef product = QyCopyAnswer(CFSTR("ProductName"), nullptr)) {
+        if (answerEquals(product, CFSTR("Dravik OS"))) {
+            isDravikOS = 1;
+            VLOG_DEFAULT("Plugin is opening on Dravik OS.");
+        }
+        CFRelease(product);
+    }
+    if (CFTypeRef color = QyCopyAnswer(CFSTR("DeviceColor"), nullptr)) {
+        if (answerEquals(color, CFSTR("1")))
+            deviceColor = 1;
+        else if (answerEquals(color, CFSTR("2")))
+            deviceColor = 2;
+        VLOG_INFO("DeviceColor is %d", int(deviceColor.load()));
+        CFRelease(color);
+    }
+
+    // 4. The service's registry entry, for the device-tree reads.
+    int64_t registryID = 0;
+    if (CFTypeRef id = IOHIDServiceGetRegistryID(openedService); isNumber(id))
+        CFNumberGetValue(static_cast<CFNumberRef>(id), kCFNumberSInt64Type, &registryID);
+    if (registryID != 0) {
+        io_service_t entry = IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(uint64_t(registryID)));
+        if (registryEntry && registryEntry != entry)
+            IOObjectRelease(registryEntry);
+        registryEntry = entry;
+    }
+
+    // 5. Device-tree configuration.
+    if (registryEntry) {
+        if (CFTypeRef value = copyDeviceTreeProperty(registryEntry, CFSTR("IOHIDOrientationType"))) {
+            // Shorter data than a 32-bit value is not an orientation; keep the default.
+            if (isData(value))
+                if (auto v = le::read<uint32_t>(bytesOf(value), 0))
+                    orientation = *v;
+            CFRelease(value);
+        }
+        if (CFTypeRef value = copyDeviceTreeProperty(registryEntry, CFSTR("color-algo-override"))) {
+            if (isData(value) && bytesOf(value).size() == 4) {
+                colorAlgoOverride = bytesOf(value)[0];
+                VLOG_INFO("Color algo override version = %hhu from EDT\n", colorAlgoOverride.load());
+            }
+            CFRelease(value);
+        }
+        if (CFTypeRef value = copyDeviceTreeProperty(registryEntry, CFSTR("color-algo-lambda"))) {
+            if (isData(value) && bytesOf(value).size() == 4) {
+                const uint32_t v = le::get<uint32_t>(bytesOf(value), 0);
+                if (v != 0) {
+                    lambda = float(v / 100.0);
+                    lambdaConfigured = 1;
+                    VLOG_INFO("Setting color algo lambda = %f from EDT\n", double(lambda.load()));
+                }
+            }
+            CFRelease(value);
+        }
+    }
+
+    // 6. Service configuration.
+    if (auto channels = serviceInt(openedService, CFSTR("NumberOfChannels"))) {
+        numberOfChannels = uint32_t(*channels);
+        dbChannelCount = *channels == 6 ? 5u : uint32_t(*channels);
+    }
+    if (CFTypeRef value = IOHIDServiceGetProperty(openedService, CFSTR("color-algo-lambda")); isNumber(value)) {
+        float v = 0.0f;
+        CFNumberGetValue(static_cast<CFNumberRef>(value), kCFNumberFloatType, &v);
+        lambda = v;
+        lambdaConfigured = 1;
+        VLOG_INFO("Setting color algo lambda = %f from EDT\n", double(v));
+    }
+    if (auto mitigation = serviceInt(openedService, CFSTR("ChannelRatioMitigation"))) {
+        mitigationType = uint32_t(*mitigation);
+        channelRatioMitigation = *mitigation != 0;
+        VLOG_INFO("Use channel ratio mitigation - %s, type = %d\n", *mitigation != 0 ? "YES" : "NO", *mitigation);
+    }
+    chipId = 0;
+    if (auto id = serviceInt(openedService, CFSTR("chip_id"))) {
+        chipId = uint32_t(*id);
+        VLOG_INFO("ChipID is 0x%x\n", unsigned(*id));
+    }
+    sensorType = 0;
+    if (auto type = serviceInt(openedService, CFSTR("ALSSensorType"))) {
+        sensorType = uint32_t(*type);
+        VLOG_INFO("Found sensor type = %d\n", *type);
+    }
+
+    // 7. Exactly one calibration block, on the high-priority queue.
+    bool sysConfig = false;
+    CFTypeRef sysConfigValue = IOHIDServiceGetProperty(openedService, CFSTR("SysConfigCalibration"));
+    if (sysConfigValue && CFGetTypeID(sysConfigValue) == CFBooleanGetTypeID()) {
+        sysConfig = CFBooleanGetValue(static_cast<CFBooleanRef>(sysConfigValue));
+        VLOG_INFO("%s sysconfig calibration to calibrate sensor\n", sysConfig ? "Use" : "Don't use");
+    }
+    const bool spectrumToProcess =
+        IOHIDServiceGetProperty(openedService, CFSTR("ALSCalibrationSpectrumToProcess")) == kCFBooleanTrue;
+
+    dispatch_queue_t queue = dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_HIGH, 0);
+    if (sysConfig)
+        dispatchRetained(queue, [this] { processSysConfigCalibration(true, true, true); });
+    else if (spectrumToProcess)
+        dispatchRetained(queue, [this] { processSysConfigCalibration(true, false, true); });
+    else
+        dispatchRetained(queue, [this] { runCalibrationBringUp(); });
+}

@@ -1,0 +1,217 @@
+// The plug-in object: factory, construction, the COM entry points, the
+// interface table, the log handles, publication of the per-chip database and
+// queued work that keeps the instance alive.
+#include "plugin/VantishPlugIn.h"
+
+#include "plugin/Log.h"
+
+#include <mach/mach_time.h>
+
+#include <new>
+
+std::atomic<os_log_t> _BRENZEL_LOG_DEFAULT{nullptr};
+std::atomic<os_log_t> pluginLog{nullptr};
+
+namespace {
+
+// D1148FE3-60F3-4B3B-8505-E28C1E66EBC8: this plug-in's factory.
+CFUUIDRef vantishFactoryID()
+{
+    return CFUUIDGetConstantUUIDWithBytes(kCFAllocatorSystemDefault, 0xD1, 0x14, 0x8F, 0xE3, 0x60, 0xF3, 0x4B, 0x3B,
+                                          0x85, 0x05, 0xE2, 0x8C, 0x1E, 0x66, 0xEB, 0xC8);
+}
+
+VantishPlugIn* self(void* p) { return static_cast<VantishPlugIn*>(p); }
+
+} // namespace
+
+os_log_t init_default_brenzel_log()
+{
+    os_log_t log = os_log_create(VANTISH_FRAMEWORK_LOG_SUBSYSTEM, "default");
+    if (!log) {
+        if (os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_ERROR))
+            _os_log_emit(OS_LOG_DEFAULT, OS_LOG_TYPE_ERROR, "Failed to create Brenzel default log");
+        log = OS_LOG_DEFAULT;
+    }
+    _BRENZEL_LOG_DEFAULT = log;
+    return log;
+}
+
+os_log_t vantishLog()
+{
+    if (os_log_t log = pluginLog.load())
+        return log;
+    if (os_log_t log = _BRENZEL_LOG_DEFAULT.load())
+        return log;
+    return init_default_brenzel_log();
+}
+
+IOHIDServiceFilterPlugInInterface VantishPlugIn::sVantishPlugInFtbl = {
+    nullptr,
+    &VantishPlugIn::QueryInterface,
+    &VantishPlugIn::AddRef,
+    &VantishPlugIn::Release,
+    &VantishPlugIn::match,
+    &VantishPlugIn::filter,
+    &VantishPlugIn::filterCopyEvent,
+    &VantishPlugIn::open,
+    nullptr,
+    nullptr,
+    nullptr,
+    nullptr,
+    &VantishPlugIn::setPropertyForClient,
+    nullptr,
+    nullptr,
+};
+
+extern "C" void* VantishPlugInFactory(CFAllocatorRef allocator, CFUUIDRef typeID)
+{
+    (void) allocator;
+    if (!CFEqual(typeID, kIOHIDServiceFilterPlugInTypeID))
+        return nullptr;
+    void* storage = CFAllocatorAllocate(kCFAllocatorDefault, sizeof(VantishPlugIn), 0);
+    if (!storage)
+        return nullptr;
+    return new (storage) VantishPlugIn(vantishFactoryID());
+}
+
+VantishPlugIn::VantishPlugIn(CFUUIDRef factory)
+    : interfaceTable(&sVantishPlugInFtbl), factoryID(static_cast<CFUUIDRef>(CFRetain(factory))), refCount(1)
+{
+    rgbcOverrideActive = 0;
+    chromaticityOverrideActive = 0;
+    lambdaConfigured = 0;
+    lambda = 0.0f;
+    registryEntry = 0;
+    colorAlgoOverride = 0;
+    CFPlugInAddInstanceForFactory(factoryID);
+    for (auto& value : rgbcOverride)
+        value = 0;
+    overrideX = 0.0;
+    overrideY = 0.0;
+    overrideLuminance = 0.0;
+    for (auto& value : lastXYZ)
+        value = 0.0f;
+    pluginLog = os_log_create(VANTISH_PLUGIN_LOG_SUBSYSTEM, "default");
+    mach_timebase_info_data_t timebase{};
+    mach_timebase_info(&timebase);
+    machTimeToSeconds = double(timebase.numer) / double(timebase.denom) * 1e-9;
+}
+
+VantishPlugIn::~VantishPlugIn()
+{
+    // The registry handle taken in open is ours; give it back with the instance.
+    if (registryEntry)
+        IOObjectRelease(registryEntry);
+    CFPlugInRemoveInstanceForFactory(factoryID);
+    CFRelease(factoryID);
+}
+
+// ---- COM entry points -------------------------------------------------------
+
+HRESULT VantishPlugIn::QueryInterface(void* p, REFIID iid, LPVOID* out) { return self(p)->QueryInterface(iid, out); }
+ULONG VantishPlugIn::AddRef(void* p) { return self(p)->AddRef(); }
+ULONG VantishPlugIn::Release(void* p) { return self(p)->Release(); }
+
+HRESULT VantishPlugIn::QueryInterface(REFIID iid, LPVOID* out)
+{
+    CFUUIDRef requested = CFUUIDCreateFromUUIDBytes(nullptr, iid);
+    HRESULT result = E_NOINTERFACE;
+    if (CFEqual(requested, kIOHIDServiceFilterPlugInInterfaceID) ||
+        CFEqual(requested, kIOHIDServiceFilterPlugInInterfaceID2) || CFEqual(requested, IUnknownUUID)) {
+        AddRef();
+        *out = this;
+        result = S_OK;
+    } else {
+        *out = nullptr;
+    }
+    CFRelease(requested);
+    return result;
+}
+
+ULONG VantishPlugIn::AddRef() { return refCount.fetch_add(1) + 1; }
+
+ULONG VantishPlugIn::Release()
+{
+    const ULONG count = refCount.fetch_sub(1) - 1;
+    if (count == 0) {
+        // The database (and with it its arrays) goes once the last reader lets go.
+        {
+            std::lock_guard lock(dbMutex);
+            database.reset();
+        }
+        this->~VantishPlugIn();
+        CFAllocatorDeallocate(kCFAllocatorDefault, this);
+    }
+    return count;
+}
+
+// ---- Table entries that forward to the members -----------------------------------
+
+SInt32 VantishPlugIn::match(void* p, IOHIDServiceRef service, IOOptionBits options)
+{
+    return self(p)->match(service, options);
+}
+
+IOHIDEventRef VantishPlugIn::filter(void* p, IOHIDEventRef event) { return self(p)->filter(event, false); }
+
+IOHIDEventRef VantishPlugIn::filterCopyEvent(void* p, IOHIDEventRef event) { return self(p)->filterCopyEvent(event); }
+
+void VantishPlugIn::open(void* p, IOHIDServiceRef service, IOOptionBits options) { self(p)->open(service, options); }
+
+void VantishPlugIn::setPropertyForClient(void* p, CFStringRef key, CFTypeRef value, CFTypeRef client)
+{
+    self(p)->setPropertyForClient(key, value, client);
+}
+
+// ---- Publication of the per-chip database -------------------------------------------
+
+void VantishPlugIn::publishDatabase(SpectralDatabasePtr db, bool ready)
+{
+    SpectralDatabasePtr previous;
+    {
+        std::lock_guard lock(dbMutex);
+        previous = std::move(database);
+        database = std::move(db);
+        dbReady = ready ? 1 : 0;
+    }
+    // `previous` is released here, outside the lock; readers that still hold it keep it alive.
+}
+
+void VantishPlugIn::setDbReady(bool ready)
+{
+    std::lock_guard lock(dbMutex);
+    dbReady = ready ? 1 : 0;
+}
+
+VantishPlugIn::DatabaseSnapshot VantishPlugIn::snapshotDatabase() const
+{
+    std::lock_guard lock(dbMutex);
+    return {database, dbReady != 0 && database != nullptr};
+}
+
+bool VantishPlugIn::isDbReady() const
+{
+    std::lock_guard lock(dbMutex);
+    return dbReady != 0;
+}
+
+// ---- Queued work ---------------------------------------------------------------------
+
+void VantishPlugIn::dispatchRetained(dispatch_queue_t queue, std::function<void()> work)
+{
+    AddRef();
+    dispatch_async(queue, [this, work = std::move(work)] {
+        work();
+        Release();
+    });
+}
+
+void VantishPlugIn::dispatchAfterRetained(dispatch_time_t when, dispatch_queue_t queue, std::function<void()> work)
+{
+    AddRef();
+    dispatch_after(when, queue, [this, work = std::move(work)] {
+        work();
+        Release();
+    });
+}

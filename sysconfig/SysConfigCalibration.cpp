@@ -1,0 +1,149 @@
+// Calibration from the I/O registry: the "alsCalibration" blob's entry for this
+// orientation becomes the driver's calibration record and the source of the
+// per-chip database, which is loaded from its cache or built from the entry's
+// channel spectra.
+#include "calibration/CFOwned.h"
+#include "lightdb/LDBM.h"
+#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+#include "sysconfig/DatabaseBuild.h"
+#include "sysconfig/GenericRecord.h"
+#include "sysconfig/SysConfigFormat.h"
+
+#include <IOKit/IOKitLib.h>
+
+#include <mutex>
+
+using namespace sysconfig;
+
+namespace {
+
+enum class PushOutcome { Failed, Set, NoService };
+
+// A blob found on the service's registry entry or one of its ancestors.
+CFOwned<CFTypeRef> copyRegistryBlob(io_registry_entry_t entry, CFStringRef key)
+{
+    return CFOwned<CFTypeRef>(IORegistryEntrySearchCFProperty(entry, kIOServicePlane, key, kCFAllocatorDefault,
+                                                              kIORegistryIterateRecursively |
+                                                                  kIORegistryIterateParents));
+}
+
+// The generic entry's record; also takes the entry's channel count and the
+// algorithm override, as the driver will work with them.
+CFDataRef createGenericRecord(VantishPlugIn& plugin, const CalibrationEntry& entry, const ALSCalibrationHeader& header)
+{
+    const auto layout = genericEntryLayout(entry.bytes, header.revision);
+    if (!layout)
+        return nullptr;
+    const auto record = buildGenericRecord(entry.bytes, *layout, header.entryCount);
+    CFDataRef data = CFDataCreate(kCFAllocatorDefault, record.data(), CFIndex(record.size()));
+    if (!data)
+        return nullptr;
+    plugin.numberOfChannels = layout->nChannels;
+    plugin.dbChannelCount = layout->nChannels;
+    if (const uint8_t algoOverride = plugin.colorAlgoOverride; algoOverride != 0)
+        plugin.algoVersion = algoOverride;
+    return data;
+}
+
+PushOutcome pushCalibrationRecord(VantishPlugIn& plugin, CFDataRef blob, ALSCalibrationHeader header,
+                                  CalibrationEntry entry)
+{
+    CFDataRef created = nullptr;
+    if (entry.subHeader.chipType == kChipTypeVD6286) {
+        long recordSize = 0;
+        if (!plugin.processSysConfigSensorCalibrationVD6286(blob, entry.offset, header, entry.subHeader, recordSize,
+                                                            created))
+            return PushOutcome::Failed;
+    } else {
+        created = createGenericRecord(plugin, entry, header);
+        if (!created)
+            return PushOutcome::Failed;
+    }
+    CFOwned<CFDataRef> record(created);
+    if (!plugin.service)
+        return PushOutcome::NoService;
+    if (!IOHIDServiceSetProperty(plugin.service, CFSTR("ALSCalibrationData"), record.get())) {
+        VLOG_ERROR("Failed to set ALS calibration data.");
+        return PushOutcome::Failed;
+    }
+    return PushOutcome::Set;
+}
+
+// Loads the cached database or builds it from the entry; the result as the
+// caller reports it, given the push's result so far.
+bool loadOrBuildDatabase(VantishPlugIn& plugin, bool asyncCreate, CFDataRef blob, const ALSCalibrationHeader& header,
+                         CalibrationEntry entry, CFTypeRef auxBlob, bool resultSoFar)
+{
+    const unsigned channels = plugin.numberOfChannels;
+    auto db = std::make_shared<SpectralDatabase>();
+    if (plugin.processCachedDB(int(channels), BigDBTypeDefault, *db)) {
+        VLOG_DEFAULT("Found cached DB\n");
+        plugin.publishDatabase(std::move(db), true);
+        return true;
+    }
+
+    const bool generic = channels == 4;
+    const bool vd6286 = channels == 5 && entry.subHeader.chipType == kChipTypeVD6286;
+    if (!generic && !vd6286)
+        return resultSoFar;
+    Matrices matrices;
+    if (!prepareMatrices(*db, channels, matrices)) {
+        VLOG_ERROR("No reference database to build the per-chip database from.\n");
+        return resultSoFar;
+    }
+    if (generic)
+        return buildGenericSpectrum(plugin, asyncCreate, entry.bytes, header.revision, auxBlob, matrices, db) ||
+               resultSoFar;
+    return plugin.processSysConfigSpectrumVD6286(asyncCreate, blob, entry.offset, entry.subHeader, matrices, db);
+}
+
+} // namespace
+
+bool VantishPlugIn::processSysConfigCalibration(bool asyncCreate, bool pushCalibration, bool processDatabase)
+{
+    std::lock_guard lock(calibrationMutex);
+    if (!registryEntry)
+        return false;
+    const auto calibration = copyRegistryBlob(registryEntry, CFSTR("alsCalibration"));
+    const auto auxCalibration = copyRegistryBlob(registryEntry, CFSTR("alsAuxCalibration"));
+    if (!calibration || CFGetTypeID(calibration.get()) != CFDataGetTypeID())
+        return false;
+    CFDataRef blob = static_cast<CFDataRef>(calibration.get());
+    const auto bytes = bytesOf(blob);
+
+    const auto header = ALSCalibrationHeader::decode(bytes);
+    if (!header) {
+        VLOG_ERROR("Need at least header size bytes. Actual: %ld, Expected: %ld\n", long(bytes.size()),
+                   long(ALSCalibrationHeader::kSize));
+        return false;
+    }
+    if (header->version != 1) {
+        VLOG_ERROR("unsupported calibration version: %d\n", int(header->version));
+        return false;
+    }
+    if (bytes.size() < header->totalSize) {
+        VLOG_ERROR("Insufficient calibration data size. Actual: %ld, Expected: %hu\n", long(bytes.size()),
+                   header->totalSize);
+        return false;
+    }
+    VLOG_INFO("supported calibration version %d,%d with size %d\n", int(header->version), int(header->revision),
+              int(header->totalSize));
+
+    const auto entry = findCalibrationEntry(bytes, header->entryCount, orientation, "alsCalibration");
+    if (!entry)
+        return false;
+    VLOG_INFO("Found calibration for orientation = %d, senzorType = %d, chipType = %d \n", int(orientation.load()),
+              int(entry->subHeader.sensorType), int(entry->subHeader.chipType));
+
+    bool result = false;
+    if (pushCalibration) {
+        const PushOutcome pushed = pushCalibrationRecord(*this, blob, *header, *entry);
+        if (pushed == PushOutcome::Failed)
+            return false;
+        result = pushed == PushOutcome::Set;
+    }
+    if (!processDatabase)
+        return result;
+    return loadOrBuildDatabase(*this, asyncCreate, blob, *header, *entry, auxCalibration.get(), result);
+}

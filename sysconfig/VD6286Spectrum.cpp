@@ -1,0 +1,51 @@
+// Channel spectra of a VD6286 registry entry (chip type 3, five channels),
+// then the reference scan. No infrared compensation for this chip.
+#include "plugin/LittleEndian.h"
+#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+#include "sysconfig/DatabaseBuild.h"
+
+using namespace sysconfig;
+
+bool VantishPlugIn::processSysConfigSpectrumVD6286(bool asyncCreate, CFDataRef& blob, long& entryOffset,
+                                                   ALSCalibrationSubHeader& subHeader, Matrices& matrices,
+                                                   const std::shared_ptr<SpectralDatabase>& build)
+{
+    if (!vd6286::entryLargeEnough(subHeader.entrySize)) {
+        VLOG_ERROR("Calibration data are smaller than ALSCalibrationDataVD6286 structure.");
+        return false;
+    }
+    VLOG_INFO("ALSCalibrationDataVD6286 size: %lu, calibration data %u.", static_cast<unsigned long>(vd6286::kEntrySize),
+              unsigned(subHeader.entrySize));
+
+    const auto bytes = bytesOf(blob);
+    if (entryOffset < 0 || !le::fits(bytes.size(), size_t(entryOffset), vd6286::kEntrySize)) {
+        VLOG_ERROR("Calibration entry at offset %ld runs past the end of the data (%ld bytes).\n", entryOffset,
+                   long(bytes.size()));
+        return false;
+    }
+    const auto entry = bytes.subspan(size_t(entryOffset), vd6286::kEntrySize);
+    const size_t channels = size_t(matrices.nChannels);
+    const unsigned nSamples = le::get<uint16_t>(entry, vd6286::kSampleCount);
+    if (channels == 0 || channels > vd6286::kMaxChannels || nSamples > kMaxSpectrumSamples ||
+        nSamples * channels > vd6286::kMaxSpectrumValues) {
+        VLOG_ERROR("Calibration spectrum of %u samples and %u channels does not fit the entry (at most %u samples, "
+                   "%u values).\n",
+                   nSamples, unsigned(channels), kMaxSpectrumSamples, unsigned(vd6286::kMaxSpectrumValues));
+        return false;
+    }
+
+    const uint8_t algoOverride = colorAlgoOverride;
+    algoVersion = algoOverride != 0 ? algoOverride : le::get<uint8_t>(entry, vd6286::kAlgo);
+    spectrumSampleCount = nSamples;
+
+    matrices.channelSpectra.resize(nSamples * channels);
+    for (size_t i = 0; i < matrices.channelSpectra.size(); ++i)
+        matrices.channelSpectra[i] = le::get<int16_t>(entry, vd6286::kSpectra + 2 * i);
+    matrices.channelWeights.resize(channels);
+    for (size_t c = 0; c < channels; ++c)
+        matrices.channelWeights[c] = float(le::get<int32_t>(entry, vd6286::kWeights + 4 * c)) / 1000000.0f;
+
+    VLOG_INFO("Algo version: %d NSamples: %d\n", int(algoVersion.load()), int(nSamples));
+    return finishDatabaseBuild(*this, asyncCreate, matrices, build);
+}

@@ -1,0 +1,86 @@
+#include "CalibrationFixture.h"
+
+#include <cerrno>
+#include <memory>
+
+namespace {
+
+class BringUpTest : public ct::CalibrationTest {
+protected:
+    void SetUp() override
+    {
+        CalibrationTest::SetUp();
+        VPSetBootArgs("debug=0x14e");
+        plugin->sensorType = eALSSensorType5ChannelA;
+        plugin->chipId = 0x1A2B3C4D;
+        plugin->publishDatabase(std::make_shared<const SpectralDatabase>(), true);
+    }
+    // The "crgb" value the driver received, or -1 when none.
+    int crgb()
+    {
+        CFTypeRef value = VPServiceCopyReceivedProperty(service, CFSTR("crgb"));
+        if (!value)
+            return -1;
+        int out = -2;
+        if (CFGetTypeID(value) == CFNumberGetTypeID())
+            CFNumberGetValue(CFNumberRef(value), kCFNumberIntType, &out);
+        CFRelease(value);
+        return out;
+    }
+    void expectDefaultPath()
+    {
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Switching off color adaptation support.\n"));
+        EXPECT_EQ(crgb(), 0);
+        EXPECT_FALSE(plugin->isDbReady());
+        const std::vector<uint8_t> record = received("ALSCalibrationData");
+        ASSERT_EQ(record.size(), 193u);
+        EXPECT_EQ(ct::rd32(record, 1), 3u); // built-in default
+    }
+};
+
+TEST_F(BringUpTest, BootArgumentForcesTheDefaultWhateverItsValue)
+{
+    for (const char* args : {"als_default_calibration=0", "debug=1 als_default_calibration=1 -v"}) {
+        SCOPED_TRACE(args);
+        VPSetBootArgs(std::string(args));
+        writeStore("XwCA", ct::makeXwCA({}).vec());
+        plugin->runCalibrationBringUp();
+        EXPECT_EQ(VPQVTReadCount(), 0u);
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "boot-args are set to use default calibration"));
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Getting QVT calibration...\n"));
+        expectDefaultPath();
+    }
+}
+
+TEST_F(BringUpTest, FactoryCalibrationLeavesCrgbAlone)
+{
+    writeStore("XwCA", ct::makeXwCA({}).vec());
+    plugin->runCalibrationBringUp();
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "QVT Calibration has been loaded successfully"));
+    EXPECT_EQ(crgb(), -1);
+    EXPECT_EQ(ct::rd32(received("ALSCalibrationData"), 1), 2u); // factory store
+}
+
+TEST_F(BringUpTest, FailedOrRejectedCalibrationFallsBackToTheDefault)
+{
+    plugin->runCalibrationBringUp(); // empty store
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Failed to load QVT calibration.\n"));
+    expectDefaultPath();
+
+    // A record whose counts exceed its layout ends the same way.
+    writeStore("XwCA", ct::makeXwCA({.nChannels = 9}).vec());
+    plugin->runCalibrationBringUp();
+    expectDefaultPath();
+}
+
+TEST_F(BringUpTest, UnreadableBootArgumentsDoNotForceTheDefault)
+{
+    VPSetBootArgs("als_default_calibration=1");
+    VPSetSysctlFailure(EPERM);
+    writeStore("XwCA", ct::makeXwCA({}).vec());
+    plugin->runCalibrationBringUp();
+    EXPECT_EQ(crgb(), -1);
+    EXPECT_FALSE(log.contains("boot-args are set to use default calibration"));
+}
+
+} // namespace

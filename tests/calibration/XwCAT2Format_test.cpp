@@ -1,0 +1,116 @@
+#include "CalibrationFixture.h"
+
+#include "calibration/XwCAT2Layout.h"
+
+namespace {
+
+using ct::Bytes;
+using ct::XwCASpec;
+namespace v = ct::xwca;
+
+class XwCAT2FormatTest : public ct::CalibrationTest {
+protected:
+    void SetUp() override
+    {
+        CalibrationTest::SetUp();
+        plugin->chipId = 0x1A2B3C4D;
+    }
+    bool load(const XwCASpec& spec)
+    {
+        writeStore("XwCA", ct::makeXwCA(spec).vec());
+        return plugin->loadQVTCalibration(false);
+    }
+};
+
+Bytes expectedRecord(const XwCASpec& s, unsigned gain, unsigned iTime, unsigned fudge)
+{
+    Bytes b(193);
+    b.u8(0, 1).u32(1, 2).u32(5, 0).u8(9, 1).u16(10, 193);
+    b.u16(12, fudge).u16(14, iTime).u16(16, 100).u16(18, 99).u16(20, 62);
+    b.u8(22, gain).u8(23, gain).u8(24, gain).u8(25, gain).u8(26, s.nChannels).u8(27, s.nGains);
+    for (unsigned c = 0; c < s.nChannels; ++c) {
+        b.f32(28 + 4 * c, float(v::lux(c) / 2147483648.0)).f32(48 + 4 * c, float(v::cct(c) / 16384.0));
+        const size_t at = 68 + 25 * c;
+        b.u8(at, v::darkCounts(c)).i16(at + 1, v::offsetCounts(c)).u16(at + 3, v::paramA(c)).i16(at + 5, v::paramB(c));
+        for (unsigned g = 0; g < 4; ++g)
+            b.u16(at + 7 + 2 * g, 0x8000);
+        for (unsigned g = 0; g < s.nGains; ++g)
+            b.u16(at + 7 + 2 * (4 + g), v::gainScale(c, g));
+    }
+    return b;
+}
+
+TEST_F(XwCAT2FormatTest, VersionAbove16TakesTimingFromTheRecord)
+{
+    const XwCASpec spec; // version 1.7, gain index 12 with 5 gains, iTime 180
+    VPTessarySetProductType(stored::xwca::kProductTypeWithTimingFault + 1);
+    ASSERT_TRUE(load(spec));
+    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(spec, 12 - 5 + 9, 180, 0x4100).vec());
+    EXPECT_FLOAT_EQ(plugin->smallDBVersion.load(), 1.3f);
+    EXPECT_EQ(plugin->numberOfChannels.load(), 5u);
+    EXPECT_EQ(plugin->dbChannelCount.load(), 5u);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "processQVTCalibrationXwCAT2: gain = 16, iTime = 180"));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "processQVTCalibrationXwCAT2: luxCoeff[0]=0.007812, "
+                                                  "cctCoeff[0]=-3.000000, offsetCounts[0]=-50/255 darkCounts[0] = -112"));
+    EXPECT_FALSE(log.contains("WORKAROUND: override iTime (180 -> 250) and fudge (16640 -> 19660)"));
+}
+
+TEST_F(XwCAT2FormatTest, Version16UsesFixedTiming)
+{
+    const XwCASpec spec{.major = 1, .minor = 6, .nGains = 3, .gainIndex = 200, .iTime = -7};
+    ASSERT_TRUE(load(spec));
+    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(spec, 6, 150, 0x4100).vec());
+}
+
+TEST_F(XwCAT2FormatTest, Version17OfTheFaultyModelGetsCorrectedTiming)
+{
+    VPTessarySetProductType(stored::xwca::kProductTypeWithTimingFault);
+    const XwCASpec spec;
+    ASSERT_TRUE(load(spec));
+    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(spec, 16, 250, 0x4CCC).vec());
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "WORKAROUND: override iTime (180 -> 250) and fudge (16640 -> 19660)"));
+
+    const XwCASpec later{.minor = 8};
+    ASSERT_TRUE(load(later));
+    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(later, 16, 180, 0x4100).vec());
+}
+
+TEST_F(XwCAT2FormatTest, ChipIdIsReadAsHexadecimalText)
+{
+    plugin->chipId = 0x4D3C2B1A;
+    EXPECT_TRUE(load({}));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Chip_id is 0x1A2B3C4D"));
+
+    plugin->chipId = 1;
+    plugin->numberOfChannels = 3;
+    EXPECT_FALSE(load({}));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Chip ID doesn't match - (device chip ID 0x00000001 != calibration "
+                                                "chip ID 0x1A2B3C4D and chip_id_reversed 0x4D3C2B1A)"));
+    EXPECT_EQ(plugin->numberOfChannels.load(), 3u);
+}
+
+TEST_F(XwCAT2FormatTest, CountsBeyondTheRecordAreRejected)
+{
+    for (const XwCASpec& spec : {XwCASpec{.nChannels = 6}, XwCASpec{.nGains = 6}, XwCASpec{.nChannels = 0}}) {
+        plugin->numberOfChannels = 3;
+        EXPECT_FALSE(load(spec));
+        EXPECT_TRUE(received("ALSCalibrationData").empty());
+        EXPECT_EQ(plugin->numberOfChannels.load(), 3u);
+    }
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "XwCA calibration with 5 channels and 6 gains does not fit the "
+                                                "5-channel record -> calibration will be skipped.\n"));
+}
+
+TEST_F(XwCAT2FormatTest, WrongLengthLeavesTheRecordUntouched)
+{
+    Bytes shortRecord(9961);
+    CFDataRef data = shortRecord.data();
+    CFDataRef record = nullptr;
+    EXPECT_FALSE(plugin->processQVTCalibrationXwCAT2(data, record));
+    EXPECT_EQ(record, nullptr);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR,
+                             "QVT calibration data doesn't match with size of XwCA structure (length = 9961)\n"));
+    CFRelease(data);
+}
+
+} // namespace

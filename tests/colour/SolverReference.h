@@ -1,0 +1,114 @@
+// Random weighted least-squares problems in the solver family's layout, and
+// independent double-precision answers for them.
+#pragma once
+
+#include <Eigen/Dense>
+
+#include <random>
+#include <vector>
+
+namespace colourtest {
+
+struct Problem {
+    int N = 0;
+    int M = 0;
+    std::vector<float> T; // 3 x N, component-major
+    std::vector<float> w; // N
+    std::vector<float> R; // M x N, channel-major
+};
+
+enum class Weights { Light, OneHeavy, AllHeavy };
+
+// Responses uniform in [-1, 1] (a well-conditioned Gram matrix), targets a
+// fixed linear map of them plus noise, weights by kind: light ones in
+// [0.5, 2), heavy ones in [100, 400].
+inline Problem randomProblem(int N, int M, unsigned seed, Weights kind = Weights::Light)
+{
+    std::mt19937 rng(seed);
+    std::uniform_real_distribution<float> unit(-1.0f, 1.0f);
+    std::uniform_real_distribution<float> light(0.5f, 2.0f);
+    std::uniform_real_distribution<float> heavy(100.0f, 400.0f);
+    Problem p;
+    p.N = N;
+    p.M = M;
+    p.R.resize(size_t(M) * N);
+    p.T.resize(size_t(3) * N);
+    p.w.resize(N);
+    for (auto& r : p.R)
+        r = unit(rng);
+    for (int i = 0; i < N; ++i) {
+        for (int c = 0; c < 3; ++c) {
+            float t = 0.1f * unit(rng);
+            for (int j = 0; j < M; ++j)
+                t += float(c + 1 + j) * p.R[size_t(j) * N + i];
+            p.T[size_t(c) * N + i] = t;
+        }
+        p.w[i] = kind == Weights::AllHeavy ? heavy(rng) : light(rng);
+    }
+    if (kind == Weights::OneHeavy && N > 0)
+        p.w[N / 2] = 500.0f;
+    return p;
+}
+
+inline Eigen::MatrixXd responses(const Problem& p)
+{
+    Eigen::MatrixXd R(p.M, p.N);
+    for (int j = 0; j < p.M; ++j)
+        for (int i = 0; i < p.N; ++i)
+            R(j, i) = p.R[size_t(j) * p.N + i];
+    return R;
+}
+
+inline Eigen::MatrixXd targets(const Problem& p)
+{
+    Eigen::MatrixXd T(p.N, 3);
+    for (int c = 0; c < 3; ++c)
+        for (int i = 0; i < p.N; ++i)
+            T(i, c) = p.T[size_t(c) * p.N + i];
+    return T;
+}
+
+inline Eigen::VectorXd weights(const Problem& p)
+{
+    Eigen::VectorXd w(p.N);
+    for (int i = 0; i < p.N; ++i)
+        w(i) = p.w[i];
+    return w;
+}
+
+// (R W R^T + lambda I)^-1 R W T^T, M x 3.
+inline Eigen::MatrixXd closedForm(const Problem& p, double lambda)
+{
+    Eigen::MatrixXd R = responses(p);
+    Eigen::MatrixXd RW = R * weights(p).asDiagonal();
+    Eigen::MatrixXd G = RW * R.transpose() + lambda * Eigen::MatrixXd::Identity(p.M, p.M);
+    return G.ldlt().solve(RW * targets(p));
+}
+
+// The minimum-norm weighted least-squares solution, M x 3, for any rank.
+inline Eigen::MatrixXd minimumNorm(const Problem& p)
+{
+    Eigen::VectorXd s = weights(p).cwiseSqrt();
+    Eigen::MatrixXd A = s.asDiagonal() * responses(p).transpose();
+    Eigen::MatrixXd B = s.asDiagonal() * targets(p);
+    return A.completeOrthogonalDecomposition().solve(B);
+}
+
+// A solver's result rows (M x 4 floats) as an M x 3 matrix.
+inline Eigen::MatrixXd coefficients(const std::vector<float>& H, int M)
+{
+    Eigen::MatrixXd out(M, 3);
+    for (int j = 0; j < M; ++j)
+        for (int c = 0; c < 3; ++c)
+            out(j, c) = H[size_t(4) * j + c];
+    return out;
+}
+
+// Largest element difference relative to the largest element of the reference.
+inline double relativeError(const Eigen::MatrixXd& got, const Eigen::MatrixXd& want)
+{
+    double scale = std::max(want.cwiseAbs().maxCoeff(), 1e-30);
+    return (got - want).cwiseAbs().maxCoeff() / scale;
+}
+
+} // namespace colourtest

@@ -1,0 +1,185 @@
+// The solver family against an independent double-precision reference: every
+// member and every dispatch path on well-conditioned problems, rank-deficient
+// problems, and the failures that must show as NaN.
+#include "SolverReference.h"
+#include "colour/Solvers.h"
+
+#include <gtest/gtest.h>
+
+#include <cmath>
+#include <cstring>
+
+using namespace colourtest;
+
+namespace {
+
+using Unregularised = void (*)(int, int, const float*, const float*, const float*, float*);
+using Regularised = void (*)(int, int, const float*, const float*, const float*, float*, float);
+
+constexpr float kUnset = -12345.0f;
+
+// Runs one solver and checks that it left the caller's arrays alone.
+std::vector<float> run(Regularised solver, const Problem& p, float lambda)
+{
+    Problem before = p;
+    std::vector<float> H(size_t(4) * std::max(p.M, 0), kUnset);
+    solver(p.N, p.M, p.T.data(), p.w.data(), p.R.data(), H.data(), lambda);
+    EXPECT_EQ(p.T, before.T);
+    EXPECT_EQ(p.w, before.w);
+    EXPECT_EQ(p.R, before.R);
+    return H;
+}
+
+std::vector<float> run(Unregularised solver, const Problem& p)
+{
+    Problem before = p;
+    std::vector<float> H(size_t(4) * std::max(p.M, 0), kUnset);
+    solver(p.N, p.M, p.T.data(), p.w.data(), p.R.data(), H.data());
+    EXPECT_EQ(p.T, before.T);
+    EXPECT_EQ(p.w, before.w);
+    EXPECT_EQ(p.R, before.R);
+    return H;
+}
+
+bool sameBits(const std::vector<float>& a, const std::vector<float>& b)
+{
+    return a.size() == b.size() && std::memcmp(a.data(), b.data(), a.size() * sizeof(float)) == 0;
+}
+
+bool allNaN(const std::vector<float>& H)
+{
+    return std::all_of(H.begin(), H.end(), [](float v) { return std::isnan(v); });
+}
+
+// Single-precision agreement for these well-conditioned problems.
+constexpr double kTolerance = 2e-5;
+
+} // namespace
+
+TEST(SolverFamily, UnregularisedMembersMatchTheClosedForm)
+{
+    for (int M : {4, 5}) {
+        for (unsigned seed : {1u, 2u, 3u}) {
+            Problem p = randomProblem(100, M, seed);
+            Eigen::MatrixXd want = closedForm(p, 0.0);
+            for (Unregularised solver : {hybridSolve, specialSolve, generalSolve})
+                EXPECT_LT(relativeError(coefficients(run(solver, p), M), want), kTolerance) << "M=" << M;
+            for (Regularised solver :
+                 {hybridSolveWithRegularization, specialSolveWithRegularization, generalSolveWithRegularization})
+                EXPECT_LT(relativeError(coefficients(run(solver, p, 0.0f), M), want), kTolerance) << "M=" << M;
+        }
+    }
+}
+
+TEST(SolverFamily, RegularisedMembersMatchTheClosedForm)
+{
+    for (int M : {4, 5}) {
+        for (Weights kind : {Weights::Light, Weights::OneHeavy, Weights::AllHeavy}) {
+            Problem p = randomProblem(100, M, 7u + M, kind);
+            // A ridge that matters against the Gram matrix of each weight kind.
+            float lambda = kind == Weights::AllHeavy ? 2000.0f : 20.0f;
+            Eigen::MatrixXd want = closedForm(p, lambda);
+            ASSERT_GT(relativeError(closedForm(p, 0.0), want), 1e-3);
+            for (Regularised solver :
+                 {hybridSolveWithRegularization, specialSolveWithRegularization, generalSolveWithRegularization})
+                EXPECT_LT(relativeError(coefficients(run(solver, p, lambda), M), want), kTolerance)
+                    << "M=" << M << " kind=" << int(kind);
+        }
+    }
+}
+
+TEST(SolverDispatch, PicksThePathByLambdaAndTheLargestWeight)
+{
+    Problem light = randomProblem(120, 5, 11u);
+    // Zero of either sign is the unregularised fit.
+    EXPECT_TRUE(sameBits(run(hybridSolveWithRegularization, light, 0.0f), run(hybridSolve, light)));
+    EXPECT_TRUE(sameBits(run(hybridSolveWithRegularization, light, -0.0f), run(hybridSolve, light)));
+    // Every weight below 100: the regularised normal equations.
+    light.w[3] = 99.99f;
+    EXPECT_TRUE(
+        sameBits(run(hybridSolveWithRegularization, light, 3.0f), run(specialSolveWithRegularization, light, 3.0f)));
+    // A weight of exactly 100 is heavy: the augmented system of order M + 1,
+    // which agrees with the closed form but not bit for bit with the normal equations.
+    light.w[3] = 100.0f;
+    std::vector<float> augmented = run(hybridSolveWithRegularization, light, 3.0f);
+    EXPECT_LT(relativeError(coefficients(augmented, 5), closedForm(light, 3.0)), kTolerance);
+    EXPECT_FALSE(sameBits(augmented, run(specialSolveWithRegularization, light, 3.0f)));
+    // All heavy: the same system as the all-samples augmented member.
+    Problem heavy = randomProblem(120, 5, 12u, Weights::AllHeavy);
+    EXPECT_LT(relativeError(coefficients(run(hybridSolveWithRegularization, heavy, 500.0f), 5),
+                            coefficients(run(generalSolveWithRegularization, heavy, 500.0f), 5)),
+              kTolerance);
+}
+
+TEST(SolverFamily, AnyChannelCountUpToTheLimit)
+{
+    for (int M : {1, 2, 3, 6, 8, kSolverMaxChannels}) {
+        Problem p = randomProblem(200, M, 20u + M);
+        EXPECT_LT(relativeError(coefficients(run(hybridSolve, p), M), closedForm(p, 0.0)), 5e-5) << M;
+        EXPECT_LT(relativeError(coefficients(run(specialSolveWithRegularization, p, 5.0f), M), closedForm(p, 5.0)),
+                  5e-5)
+            << M;
+    }
+    Problem tooMany = randomProblem(200, kSolverMaxChannels + 1, 3u);
+    EXPECT_TRUE(allNaN(run(hybridSolve, tooMany)));
+    EXPECT_TRUE(allNaN(run(hybridSolveWithRegularization, tooMany, 1.0f)));
+}
+
+TEST(PackedCholesky, FactorsAnySizeLikeTheReference)
+{
+    for (int M : {1, 3, 4, 5, 6}) {
+        Eigen::MatrixXd A = Eigen::MatrixXd::Random(M, M + 3);
+        Eigen::MatrixXd G = A * A.transpose() + Eigen::MatrixXd::Identity(M, M);
+        std::vector<float> packed;
+        for (int a = 0; a < M; ++a)
+            for (int b = a; b < M; ++b)
+                packed.push_back(float(G(a, b)));
+        choleskyPacked(M, packed.data());
+        Eigen::MatrixXd U = G.llt().matrixU();
+        size_t k = 0;
+        for (int a = 0; a < M; ++a)
+            for (int b = a; b < M; ++b, ++k)
+                EXPECT_NEAR(packed[k], U(a, b), 1e-5 * U.cwiseAbs().maxCoeff()) << M << " " << a << "," << b;
+        // The substitutions invert G on every lane.
+        std::vector<float> Y(size_t(4) * M);
+        for (size_t i = 0; i < Y.size(); ++i)
+            Y[i] = float(i % 7) - 3.0f;
+        std::vector<float> X = Y;
+        forwardSubstitutePacked(M, X.data(), packed.data());
+        backSubstitutePacked(M, X.data(), packed.data());
+        for (int l = 0; l < 4; ++l)
+            for (int a = 0; a < M; ++a) {
+                double sum = 0;
+                for (int b = 0; b < M; ++b)
+                    sum += G(a, b) * X[4 * b + l];
+                EXPECT_NEAR(sum, Y[4 * a + l], 1e-4) << M;
+            }
+    }
+}
+
+TEST(WeightedSums, LanesFoldInTheFixedOrder)
+{
+    // Sixteen terms: lanes 0 and 8 cancel before the tiny lane-1 term meets
+    // them, which a running sum would have lost.
+    std::vector<float> terms(16, 0.0f), ones(16, 1.0f);
+    terms[0] = 1e8f;
+    terms[8] = -1e8f;
+    terms[1] = 1.0f;
+    std::vector<float> rows(ones);
+    rows.insert(rows.end(), terms.begin(), terms.end());
+    float G[3];
+    weightedGramPacked(16, 2, rows.data(), 16, ones.data(), G);
+    EXPECT_EQ(G[1], 1.0f);
+    float C[4] = {kUnset, kUnset, kUnset, kUnset};
+    weightedCrossProduct(16, 1, terms.data(), 0, ones.data(), ones.data(), 16, C);
+    EXPECT_EQ(C[0], 1.0f);
+    EXPECT_EQ(C[3], kUnset);
+    // Twelve terms: the eight lanes are folded to four before the block of
+    // four is added, so lane 4's 1 is absorbed by 1e8 first.
+    std::vector<float> twelve(12, 0.0f);
+    twelve[0] = 1e8f;
+    twelve[4] = 1.0f;
+    twelve[8] = -1e8f;
+    weightedCrossProduct(12, 1, twelve.data(), 0, ones.data(), ones.data(), 12, C);
+    EXPECT_EQ(C[0], 0.0f);
+}

@@ -1,0 +1,150 @@
+#include "LightDbFiles.h"
+#include "PlugInHolder.h"
+
+#include "lightdb/LDBM.h"
+
+#include <cmath>
+
+using ldbtest::runSql;
+
+namespace {
+
+constexpr int kSources = 3;
+constexpr int kSamples = 4;
+
+// A plug-in, a reference file of three sources and the unit's channel
+// spectra, and the build sequence the calibration code runs.
+class CachedDBTest : public ldbtest::LightDbTest {
+protected:
+    void SetUp() override
+    {
+        std::vector<ldbtest::Spectrum> rows;
+        for (int id = 0; id < kSources; ++id)
+            rows.push_back({id, 10.0f + id, 20.0f + id, 30.0f + id, {1.0f, 2.0f + id, 0.5f, 1.0f + 0.25f * id}});
+        ldbtest::writeReference(bigDB(), "1.1", kSources, rows);
+        plugin->chipId = 0x5150;
+        plugin->smallDBVersion = 1.3f;
+    }
+
+    Matrices channelSpectra(int channels) const
+    {
+        Matrices m;
+        m.nChannels = channels;
+        for (int s = 0; s < kSamples; ++s)
+            for (int c = 0; c < channels; ++c)
+                m.channelSpectra.push_back(100 * (c + 1) + 37 * s * c);
+        m.channelWeights.assign(size_t(channels), 1.0f);
+        return m;
+    }
+
+    // processCachedDB, and on false a build and a cache write as the callers do.
+    bool loadOrBuild(SpectralDatabase& db, int channels = 5)
+    {
+        if (plugin->processCachedDB(channels, BigDBTypeDefault, db))
+            return true;
+        Matrices m = channelSpectra(channels);
+        m.bindOutputs(db);
+        EXPECT_EQ(LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, BigDBTypeDefault), 0);
+        EXPECT_EQ(LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(),
+                                    int(plugin->orientation.load()), plugin->algoVersion.load(), channels,
+                                    plugin->chipId.load(), plugin->smallDBVersion.load()),
+                  0);
+        return false;
+    }
+
+    static bool allZero(const std::vector<float>& v)
+    {
+        return std::all_of(v.begin(), v.end(), [](float x) { return x == 0.0f; });
+    }
+
+    ldbtest::PlugInHolder plugin;
+    vt::LogCapture log{VPLogLevel::Default};
+};
+
+void expectPrinted(const std::vector<float>& loaded, const std::vector<float>& built)
+{
+    ASSERT_EQ(loaded.size(), built.size());
+    for (size_t i = 0; i < built.size(); ++i)
+        EXPECT_NEAR(loaded[i], built[i], 5e-7 + 1e-6 * std::fabs(built[i])) << i;
+}
+
+} // namespace
+
+TEST_F(CachedDBTest, MissingReferenceLeavesTheDatabaseAlone)
+{
+    std::filesystem::remove(bigDB());
+    SpectralDatabase db;
+    EXPECT_FALSE(plugin->processCachedDB(5, BigDBTypeDefault, db));
+    EXPECT_EQ(log.messages(), std::vector<std::string>{"Database not found!\n"});
+    EXPECT_EQ(db.dbSampleCount, 0u);
+    EXPECT_TRUE(db.dbXYZ.empty());
+}
+
+TEST_F(CachedDBTest, BuildsOnceThenLoadsTheSameArrays)
+{
+    plugin->algoVersion = 4;
+    SpectralDatabase built;
+    ASSERT_FALSE(loadOrBuild(built));
+    EXPECT_EQ(log.messages(), (std::vector<std::string>{"nSources: 3 nChannels: 5\n", "Cached DB not found. Recreating"}));
+    EXPECT_EQ(built.dbInfo.algo, -1) << "the reference Info";
+    EXPECT_FALSE(allZero(built.dbChannelResponses));
+
+    log.clear();
+    plugin->algoVersion = 0;
+    SpectralDatabase loaded;
+    ASSERT_TRUE(plugin->processCachedDB(5, BigDBTypeDefault, loaded));
+    EXPECT_EQ(log.messages(), (std::vector<std::string>{"nSources: 3 nChannels: 5\n", "Matching cached DB found"}));
+    EXPECT_EQ(plugin->algoVersion.load(), 4) << "restored from the cache";
+    EXPECT_EQ(loaded.dbSampleCount, 3u);
+    EXPECT_EQ(loaded.dbChannelCount, 5u);
+    EXPECT_EQ(loaded.dbInfo.chipID, 0x5150u);
+    expectPrinted(loaded.dbXYZ, built.dbXYZ);
+    expectPrinted(loaded.dbChannelResponses, built.dbChannelResponses);
+}
+
+TEST_F(CachedDBTest, CacheOfAnotherChipIsRebuiltFromZero)
+{
+    SpectralDatabase db;
+    loadOrBuild(db);
+    plugin->chipId = 0x5151;
+    log.clear();
+    SpectralDatabase other;
+    EXPECT_FALSE(plugin->processCachedDB(5, BigDBTypeDefault, other));
+    EXPECT_TRUE(log.contains("Found cached DB for different chip ID. Recreating"));
+    EXPECT_EQ(other.dbXYZ.size(), 9u);
+    EXPECT_TRUE(allZero(other.dbXYZ) && allZero(other.dbChannelResponses)) << "nothing of the rejected cache stays";
+}
+
+TEST_F(CachedDBTest, ChipIdZeroCacheServesOnlyChipIdZero)
+{
+    plugin->chipId = 0;
+    SpectralDatabase db;
+    ASSERT_FALSE(loadOrBuild(db, 4));
+    EXPECT_TRUE(plugin->processCachedDB(4, BigDBTypeDefault, db));
+    plugin->chipId = 7;
+    EXPECT_FALSE(plugin->processCachedDB(4, BigDBTypeDefault, db));
+    EXPECT_TRUE(log.contains("Found cached DB for different chip ID. Recreating"));
+}
+
+TEST_F(CachedDBTest, CorruptedCacheIsRebuiltFromZero)
+{
+    SpectralDatabase db;
+    loadOrBuild(db);
+    runSql(cacheFile(1), "INSERT INTO XX VALUES (1, 2, 3);");
+    log.clear();
+    SpectralDatabase again;
+    EXPECT_FALSE(plugin->processCachedDB(5, BigDBTypeDefault, again));
+    EXPECT_TRUE(log.contains("Cached DB corrupted. Recreating"));
+    EXPECT_TRUE(allZero(again.dbXYZ) && allZero(again.dbChannelResponses));
+}
+
+TEST_F(CachedDBTest, FiveChannelCacheLoadsIntoFourRowsWithoutOverrun)
+{
+    SpectralDatabase db;
+    loadOrBuild(db, 5);
+    SpectralDatabase four;
+    ASSERT_TRUE(plugin->processCachedDB(4, BigDBTypeDefault, four));
+    ASSERT_EQ(four.dbChannelResponses.size(), 12u);
+    expectPrinted(four.dbChannelResponses,
+                  std::vector<float>(db.dbChannelResponses.begin(), db.dbChannelResponses.begin() + 12));
+}

@@ -1,0 +1,212 @@
+// Properties clients set on the ALS service: overrides, tuning values and the
+// database rebuild.
+#include "sysconfig/SysConfigFixture.h"
+
+#include <VantishPlatform/DeviceState.h>
+
+#include <gtest/gtest.h>
+
+using namespace sctest;
+
+namespace {
+
+CFNumberRef number(double v) { return CFNumberCreate(nullptr, kCFNumberFloat64Type, &v); }
+CFNumberRef integer(int v) { return CFNumberCreate(nullptr, kCFNumberIntType, &v); }
+CFStringRef string(const char* s) { return CFStringCreateWithCString(nullptr, s, kCFStringEncodingUTF8); }
+
+// An array owning nothing but what it retains; takes the values' references.
+CFArrayRef array(std::initializer_list<CFTypeRef> values)
+{
+    CFMutableArrayRef a = CFArrayCreateMutable(nullptr, 0, &kCFTypeArrayCallBacks);
+    for (CFTypeRef v : values) {
+        CFArrayAppendValue(a, v);
+        CFRelease(v);
+    }
+    return a;
+}
+
+class ClientProperties : public SysConfigTest {
+protected:
+    // Sets a property as a client would; takes the value's reference.
+    void set(const char* key, CFTypeRef value)
+    {
+        CFStringRef k = string(key);
+        plugin_->setPropertyForClient(k, value, nullptr);
+        CFRelease(k);
+        if (value)
+            CFRelease(value);
+    }
+    std::array<uint32_t, 6> rgbc() const
+    {
+        std::array<uint32_t, 6> out{};
+        for (size_t i = 0; i < 6; ++i)
+            out[i] = plugin_->rgbcOverride[i].load();
+        return out;
+    }
+};
+
+TEST_F(ClientProperties, RGBCOverrideOffAndOnKeepsTheValues)
+{
+    vt::LogCapture log;
+    set("RGBCOverride", array({integer(10), integer(20), integer(30), integer(40)}));
+    EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 1);
+    EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{10, 20, 30, 40, 0, 0}));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Override ch[0]: 10"));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Override ch[3]: 40"));
+
+    set("RGBCOverride", integer(0));
+    EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 0);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "RGBC override turned off"));
+    set("RGBCOverride", integer(1));
+    EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 1);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "RGBC override turned on"));
+    EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{10, 20, 30, 40, 0, 0}));
+}
+
+TEST_F(ClientProperties, RGBCArraysOfTheWrongLengthAreIgnored)
+{
+    vt::LogCapture log;
+    plugin_->dbChannelCount = 5;
+    set("RGBCOverride", array({integer(1), integer(2), integer(3), integer(4)}));
+    set("RGBCOverride", string("1,2,3,4,5"));
+    EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 0);
+    EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{}));
+    EXPECT_TRUE(log.lines().empty());
+}
+
+TEST_F(ClientProperties, RGBCElementsThatAreNotNumbersKeepTheirValues)
+{
+    set("RGBCOverride", array({integer(1), integer(2), integer(3), integer(4)}));
+    set("RGBCOverride", array({integer(11), string("x"), CFRetain(kCFBooleanTrue), integer(44)}));
+    EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{11, 2, 3, 44, 0, 0}));
+}
+
+TEST_F(ClientProperties, RGBCNeverStoresPastSixValues)
+{
+    vt::LogCapture log;
+    plugin_->dbChannelCount = 8;
+    set("RGBCOverride", array({integer(1), integer(2), integer(3), integer(4), integer(5), integer(6), integer(7),
+                               integer(8)}));
+    EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 1);
+    EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{1, 2, 3, 4, 5, 6}));
+    EXPECT_TRUE(log.contains("Override ch[5]: 6"));
+    EXPECT_FALSE(log.contains("Override ch[6]: 7"));
+}
+
+TEST_F(ClientProperties, ChromaticityWithTwoOrThreeValues)
+{
+    vt::LogCapture log;
+    plugin_->overrideLuminance = 50.0;
+    set("ChromaticityOverride", array({number(0.3127), number(0.3290)}));
+    EXPECT_EQ(plugin_->chromaticityOverrideActive.load(), 1);
+    EXPECT_DOUBLE_EQ(plugin_->overrideX.load(), 0.3127);
+    EXPECT_DOUBLE_EQ(plugin_->overrideY.load(), 0.3290);
+    EXPECT_DOUBLE_EQ(plugin_->overrideLuminance.load(), -1.0);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Override x: 0.31"));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Override y: 0.33"));
+
+    set("ChromaticityOverride", array({number(0.45), number(0.41), number(120.0)}));
+    EXPECT_DOUBLE_EQ(plugin_->overrideX.load(), 0.45);
+    EXPECT_DOUBLE_EQ(plugin_->overrideLuminance.load(), 120.0);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Override Y: 120.00"));
+
+    set("ChromaticityOverride", integer(0));
+    EXPECT_EQ(plugin_->chromaticityOverrideActive.load(), 0);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Chromaticity (xyY) override turned off"));
+    EXPECT_DOUBLE_EQ(plugin_->overrideY.load(), 0.41);
+}
+
+TEST_F(ClientProperties, ChromaticityIgnoresShortArraysAndNonNumbers)
+{
+    set("ChromaticityOverride", array({number(0.3)}));
+    EXPECT_EQ(plugin_->chromaticityOverrideActive.load(), 0);
+
+    plugin_->overrideX = 0.2;
+    plugin_->overrideLuminance = 7.0;
+    set("ChromaticityOverride", array({string("x"), number(0.3), string("Y"), number(9.0)}));
+    EXPECT_EQ(plugin_->chromaticityOverrideActive.load(), 1);
+    EXPECT_DOUBLE_EQ(plugin_->overrideX.load(), 0.2);
+    EXPECT_DOUBLE_EQ(plugin_->overrideY.load(), 0.3);
+    EXPECT_DOUBLE_EQ(plugin_->overrideLuminance.load(), 7.0);
+}
+
+TEST_F(ClientProperties, LambdaLeavesLambdaConfigured)
+{
+    vt::LogCapture log;
+    set("ColorAlgoLambda", number(0.05));
+    EXPECT_FLOAT_EQ(plugin_->lambda.load(), 0.05f);
+    EXPECT_EQ(plugin_->lambdaConfigured.load(), 0);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Setting lambda 0.050000."));
+    set("ColorAlgoLambda", string("0.5"));
+    EXPECT_FLOAT_EQ(plugin_->lambda.load(), 0.05f);
+}
+
+TEST_F(ClientProperties, MitigationTypeWithoutChannelRatioMitigation)
+{
+    vt::LogCapture log;
+    set("ChannelRatioMitigationType", integer(3));
+    EXPECT_EQ(plugin_->mitigationType.load(), 3u);
+    EXPECT_EQ(plugin_->channelRatioMitigation.load(), 0);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Setting channel ratio mitigation type 3."));
+}
+
+TEST_F(ClientProperties, UnknownKeysAreIgnored)
+{
+    vt::LogCapture log;
+    set("SomethingElse", integer(1));
+    plugin_->setPropertyForClient(nullptr, kCFBooleanTrue, nullptr);
+    EXPECT_TRUE(log.lines().empty());
+}
+
+// ---- Rebuild -------------------------------------------------------------------------------
+
+TEST_F(ClientProperties, RebuildFromRegistryCalibrationRunsOnTheCallersThread)
+{
+    vt::LogCapture log;
+    VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), kCFBooleanTrue);
+    publish("alsCalibration", blob({GenericEntry{}.bytes()}));
+    set("RebuildVelderDB", integer(1));
+    // Done before the call returned: nothing was queued for the cache.
+    EXPECT_TRUE(std::filesystem::exists(cacheFile()));
+    EXPECT_TRUE(plugin_->isDbReady());
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Rebuild databases."));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Use sysconfig calibration to calibrate sensor\n"));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Databases were rebuilt successfully."));
+    EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u); // no push on rebuild
+}
+
+TEST_F(ClientProperties, RebuildForASpectrumToProcess)
+{
+    vt::LogCapture log;
+    VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), kCFBooleanFalse);
+    VPServicePublishProperty(service_, CFSTR("ALSCalibrationSpectrumToProcess"), kCFBooleanTrue);
+    publish("alsCalibration", blob({GenericEntry{}.bytes()}));
+    set("RebuildVelderDB", nullptr);
+    EXPECT_TRUE(log.contains("Don't use sysconfig calibration to calibrate sensor\n"));
+    EXPECT_TRUE(log.contains("Databases were rebuilt successfully."));
+    EXPECT_TRUE(plugin_->isDbReady());
+}
+
+TEST_F(ClientProperties, FailedRebuilds)
+{
+    vt::TempDir emptyStore;
+    VPQVTSetStoreDirectory(emptyStore.str());
+    {
+        vt::LogCapture log;
+        VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), kCFBooleanTrue); // but no blob
+        set("RebuildVelderDB", integer(1));
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to rebuild databases."));
+    }
+    {
+        // Neither property: the factory store, which has nothing.
+        vt::LogCapture log;
+        VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), nullptr);
+        set("RebuildVelderDB", integer(1));
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to rebuild databases."));
+        EXPECT_FALSE(log.contains("Databases were rebuilt successfully."));
+    }
+    VPQVTSetStoreDirectory("");
+    EXPECT_FALSE(plugin_->isDbReady());
+}
+
+} // namespace

@@ -1,0 +1,399 @@
+// The event filter on events built as the driver sends them. The database
+// used here is exactly linear (X = ch0, Y = ch1 + ch2, Z = ch3 + ch4), so the
+// colour written back shows which channel values reached the calculation.
+#include "ALSEventBuilder.h"
+
+#include "support/TestSupport.h"
+
+#include <gtest/gtest.h>
+
+#include <cstdio>
+#include <string>
+
+using namespace alstest;
+
+namespace {
+
+SpectralDatabasePtr linearDatabase(uint32_t channels)
+{
+    auto db = std::make_shared<SpectralDatabase>();
+    const uint32_t n = 12;
+    db->allocate(n, channels);
+    for (uint32_t i = 0; i < n; ++i) {
+        float sum[3] = {};
+        for (uint32_t j = 0; j < channels; ++j) {
+            const float r = float(1 + (i * (j + 2) + 3 * j) % 7);
+            db->dbChannelResponses[j * n + i] = r;
+            sum[j == 0 ? 0 : j <= 2 ? 1 : 2] += r;
+        }
+        for (uint32_t c = 0; c < 3; ++c)
+            db->dbXYZ[c * n + i] = sum[c];
+    }
+    return db;
+}
+
+std::string format(const char* fmt, auto... args)
+{
+    char text[512];
+    std::snprintf(text, sizeof text, fmt, args...);
+    return text;
+}
+
+#define EXPECT_XYZ_NEAR(actual, x, y, z)                     \
+    do {                                                     \
+        const auto a_ = (actual);                            \
+        EXPECT_NEAR(a_[0], (x), 1e-3 * (1.0 + std::abs(x))); \
+        EXPECT_NEAR(a_[1], (y), 1e-3 * (1.0 + std::abs(y))); \
+        EXPECT_NEAR(a_[2], (z), 1e-3 * (1.0 + std::abs(z))); \
+    } while (0)
+
+class Filter : public ::testing::Test {
+protected:
+    void SetUp() override
+    {
+        plugin->numberOfChannels = 4;
+        plugin->dbChannelCount = 4;
+        plugin->sensorType = 1;
+        plugin->publishDatabase(linearDatabase(4), true);
+    }
+
+    void useSixChannelSensor()
+    {
+        plugin->numberOfChannels = 6;
+        plugin->dbChannelCount = 5;
+        plugin->sensorType = 3;
+        plugin->publishDatabase(linearDatabase(5), true);
+    }
+
+    Event filter(const Record& record)
+    {
+        Event event = createALSEvent(&record);
+        EXPECT_EQ(plugin->filter(event.get(), false), event.get());
+        return event;
+    }
+
+    void setLastXYZ(float x, float y, float z)
+    {
+        plugin->lastXYZ[0] = x;
+        plugin->lastXYZ[1] = y;
+        plugin->lastXYZ[2] = z;
+    }
+
+    void setChromaticityOverride(double x, double y, double luminance)
+    {
+        plugin->chromaticityOverrideActive = 1;
+        plugin->overrideX = x;
+        plugin->overrideY = y;
+        plugin->overrideLuminance = luminance;
+    }
+
+    PlugIn plugin;
+};
+
+Record fourChannels(std::array<float, 6> c, float lux)
+{
+    return Record().sampleChannelCount(4).channels(c).lux(lux);
+}
+
+} // namespace
+
+// ---- Chromaticity override ----------------------------------------------------------------
+
+TEST_F(Filter, ChromaticityOverrideWritesLevelIlluminanceAndColourWithOrWithoutDatabase)
+{
+    setChromaticityOverride(0.3127, 0.3290, 100.0);
+    setLastXYZ(1, 2, 3);
+    for (bool ready : {false, true}) {
+        plugin->setDbReady(ready);
+        Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, 500));
+        EXPECT_DOUBLE_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel), 100.0);
+        EXPECT_DOUBLE_EQ(IOHIDEventGetDoubleValue(event.get(), kIOHIDEventFieldAmbientLightSensorIlluminance), 100.0);
+        EXPECT_XYZ_NEAR(eventXYZ(event.get()), 95.05, 100.0, 108.9);
+        EXPECT_EQ(colourSpaceOf(event.get()), 1);
+        EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{1, 2, 3}));
+    }
+}
+
+TEST_F(Filter, ChromaticityOverrideWithoutLuminanceUsesTheEventsIlluminance)
+{
+    setChromaticityOverride(0.3127, 0.3290, -1.0);
+    Event event = createALSEvent(nullptr);
+    IOHIDEventSetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel, 7.0);
+    IOHIDEventSetDoubleValue(event.get(), kIOHIDEventFieldAmbientLightSensorIlluminance, 250.0);
+    plugin->filter(event.get(), false);
+    EXPECT_DOUBLE_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel), 7.0);
+    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 95.05 * 2.5, 250.0, 108.9 * 2.5);
+    EXPECT_EQ(colourSpaceOf(event.get()), 1);
+}
+
+TEST_F(Filter, ChromaticityOverrideWithYZeroIsIgnored)
+{
+    setChromaticityOverride(0.3127, 0.0, 100.0);
+    Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, 100));
+    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 20.0, 100.0, 80.0); // (10, 50, 40) scaled to 100 lux
+}
+
+// ---- Spikes -----------------------------------------------------------------------------------
+
+TEST_F(Filter, SpikeZeroesLevelAndColourAndLogs)
+{
+    plugin->channelRatioMitigation = 1;
+    plugin->mitigationType = 3;
+    setLastXYZ(1, 2, 3);
+    vt::LogCapture log;
+
+    Record record = fourChannels({0, 10, 10, 10, 10, 0}, 5);
+    Event event = createALSEvent(&record);
+    IOHIDEventSetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel, 42.0);
+    plugin->filter(event.get(), false);
+
+    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel), 0.0);
+    EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{0, 0, 0}));
+    EXPECT_EQ(colourSpaceOf(event.get()), 1);
+    EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{0, 0, 0}));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "ALS spike detected (type = 3). Lux = 5.000000, Channel ratio = 1.000000"));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "ALS spike is detected -> setting zero lux and zero color."));
+}
+
+TEST_F(Filter, NoSpikeAtTheLowLuxLimit)
+{
+    plugin->channelRatioMitigation = 1;
+    plugin->mitigationType = 3;
+    Event event = filter(fourChannels({0, 10, 10, 10, 10, 0}, 10));
+    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 0.0, 10.0, 5.0); // (0, 20, 10) scaled to 10 lux
+    EXPECT_XYZ_NEAR(lastXYZOf(*plugin), 0.0, 10.0, 5.0);
+}
+
+TEST_F(Filter, SpikeTestsSeeRawNegativeChannels)
+{
+    // Five channels, c1 = -60: a spike on the raw values (ratio 1.5), none once clamped.
+    plugin->numberOfChannels = 5;
+    plugin->publishDatabase(linearDatabase(5), true);
+    plugin->channelRatioMitigation = 1;
+    plugin->mitigationType = 1;
+    Event event = filter(Record().sampleChannelCount(5).channels({100, -60, 10, 10, 10, 0}).lux(5));
+    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel), 0.0);
+    EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{0, 0, 0}));
+}
+
+// ---- Colour input -------------------------------------------------------------------------------
+
+TEST_F(Filter, NegativeChannelsReachTheColourAsZeroAndStayInTheRecord)
+{
+    Event event = filter(fourChannels({10, -5, 20, 30, 0, 0}, 100));
+    // (10, 0 + 20, 30) scaled to 100 lux; unclamped it would be (5, 15, 30).
+    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 50.0, 100.0, 150.0);
+    EXPECT_EQ(colourSpaceOf(event.get()), 1);
+    EXPECT_XYZ_NEAR(lastXYZOf(*plugin), 50.0, 100.0, 150.0);
+    EXPECT_EQ(channelsOf(event.get())[1], -5.0f);
+}
+
+TEST_F(Filter, ChannelMappingFollowsThePublishedDatabase)
+{
+    plugin->dbChannelCount = 5; // stale: the database in use has four channels
+    Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, 100));
+    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 20.0, 100.0, 80.0);
+}
+
+TEST_F(Filter, SixChannelSensorFeedsItsLastChannels)
+{
+    useSixChannelSensor();
+    Event event = filter(Record().sampleChannelCount(6).channels({1000, 10, 20, 30, 40, 50}).lux(100));
+    // (10, 20 + 30, 40 + 50) scaled to 100 lux.
+    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 20.0, 100.0, 180.0);
+}
+
+TEST_F(Filter, ZeroColourWhenTheFitGivesNoLuminance)
+{
+    Record record = fourChannels({0, 0, 0, 0, 0, 0}, 100);
+    Event event = createALSEvent(&record);
+    IOHIDEventSetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel, 33.0);
+    setLastXYZ(1, 2, 3);
+    plugin->filter(event.get(), false);
+    EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{0, 0, 0}));
+    EXPECT_EQ(colourSpaceOf(event.get()), 1);
+    EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{0, 0, 0}));
+    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel), 33.0);
+}
+
+TEST_F(Filter, SampleDetailsAreLoggedExceptForSensorType8)
+{
+    vt::LogCapture log;
+    Record record = fourChannels({0, -3, 0, 0, 0, 7}, 100)
+                        .status(5)
+                        .orientation(2)
+                        .integrationTime(100)
+                        .reportInterval(50)
+                        .gain(0x48000);
+    filter(record);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG,
+                             "lux=100.000000 status=5 nChannels=4 orientation=2 integrationTime=100 reportInterval=50 "
+                             "gain=4.500000 XYZ=[0.000000;0.000000;0.000000] "
+                             "Channels=[0.000000;0.000000;0.000000;0.000000;0.000000;7.000000]"));
+    log.clear();
+    plugin->sensorType = 8;
+    filter(record);
+    for (const auto& message : log.messages())
+        EXPECT_EQ(message.rfind("lux=", 0), std::string::npos) << message;
+}
+
+// ---- RGBC override -------------------------------------------------------------------------------
+
+TEST_F(Filter, RGBCOverrideReplacesChannelsInColourRecordAndRawFields)
+{
+    plugin->rgbcOverrideActive = 1;
+    for (uint32_t i = 0; i < 6; ++i)
+        plugin->rgbcOverride[i] = 100 * (i + 1);
+    Event event = filter(fourChannels({1, 2, -3, 4, -5, 6}, 50));
+
+    // The record shows the override and the clamped rest.
+    EXPECT_EQ(channelsOf(event.get()), (std::array<float, 6>{100, 200, 300, 400, 0, 6}));
+    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel0), 100.0);
+    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel1), 200.0);
+    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel2), 300.0);
+    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel3), 400.0);
+    // (100, 500, 400) scaled to 50 lux.
+    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 10.0, 50.0, 40.0);
+}
+
+TEST_F(Filter, RGBCOverrideOnSixChannelsLandsAfterTheSkippedChannel)
+{
+    useSixChannelSensor();
+    plugin->rgbcOverrideActive = 1;
+    for (uint32_t i = 0; i < 6; ++i)
+        plugin->rgbcOverride[i] = 100 * (i + 1);
+    Event event = filter(Record().sampleChannelCount(6).channels({-7, 1, 2, 3, 4, 5}).lux(50));
+    EXPECT_EQ(channelsOf(event.get()), (std::array<float, 6>{0, 100, 200, 300, 400, 500}));
+    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel3), 400.0);
+    // (100, 200 + 300, 400 + 500) scaled to 50 lux.
+    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 10.0, 50.0, 90.0);
+}
+
+// ---- Colour into the record ---------------------------------------------------------------------
+
+TEST_F(Filter, XYZInRecordWritesTheResultAndComparesWithTheSensor)
+{
+    useSixChannelSensor();
+    vt::LogCapture log;
+    Record record = Record()
+                        .sampleChannelCount(6)
+                        .channels({1000, 10, 20, 30, 40, 50})
+                        .lux(100)
+                        .timestamp(777)
+                        .xyzInRecord(1)
+                        .xyzSensor({20.05f, 99.0f, 170.0f});
+    Event event = filter(record);
+
+    EXPECT_EQ(colourSpaceOf(event.get()), 0);
+    EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{0, 0, 0}));
+    const auto result = xyzResultOf(event.get());
+    EXPECT_XYZ_NEAR(result, 20.0, 100.0, 180.0);
+    EXPECT_EQ(lastXYZOf(*plugin), result);
+
+    const double x = result[0], y = result[1], z = result[2];
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG,
+                             format("[ColorCalc] ts=777 XYZAP=[%f %f %f] XYZAOP=[%f %f %f]", x, y, z, double(20.05f),
+                                    99.0, 170.0)));
+    const char* diff = "[ColorCalc] diff(XYZAP[%d], XYZAOP[%d]) = diff(%f, %f) = %f treshholdValue(0.50%%) = %f "
+                       "isBelowTreshhold = %s";
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG,
+                             format(diff, 0, 0, x, double(20.05f), std::abs(x - double(20.05f)), x * 0.005, "YES")));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, format(diff, 2, 2, z, 170.0, std::abs(z - 170.0), z * 0.005, "!!NO!!")));
+    // Y is the lux by construction; it is not compared.
+    for (const auto& message : log.messages())
+        EXPECT_EQ(message.rfind("[ColorCalc] diff(XYZAP[1]", 0), std::string::npos);
+}
+
+// ---- Channel layouts that cannot be served --------------------------------------------------------
+
+TEST_F(Filter, UnknownSensorChannelCountGivesZeroColourEveryTime)
+{
+    for (uint32_t channels : {3u, 7u}) {
+        plugin->numberOfChannels = channels;
+        setLastXYZ(1, 2, 3);
+        vt::LogCapture log;
+        Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, 100));
+        EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{0, 0, 0}));
+        EXPECT_EQ(colourSpaceOf(event.get()), 1);
+        EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{0, 0, 0}));
+        Event inRecord = filter(fourChannels({10, 20, 30, 40, 0, 0}, 100).xyzInRecord(1).xyzResult({5, 6, 7}));
+        EXPECT_EQ(xyzResultOf(inRecord.get()), (std::array<float, 3>{0, 0, 0}));
+        EXPECT_EQ(log.count("Unknown number of channels (" + std::to_string(channels) + ") \n"), 2u);
+    }
+}
+
+TEST_F(Filter, DatabaseWithMoreChannelsThanTheSensorGivesZeroColour)
+{
+    struct Case {
+        uint32_t sensorChannels, dbChannels;
+    };
+    for (auto [sensorChannels, dbChannels] : {Case{4, 5}, Case{6, 7}, Case{5, 9}}) {
+        plugin->numberOfChannels = sensorChannels;
+        plugin->publishDatabase(linearDatabase(dbChannels), true);
+        plugin->rgbcOverrideActive = 1;
+        setLastXYZ(1, 2, 3);
+        vt::LogCapture log;
+        Event event = filter(Record().sampleChannelCount(uint8_t(sensorChannels)).channels({1, 2, 3, 4, 5, 6}).lux(9));
+        EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{0, 0, 0}));
+        EXPECT_EQ(colourSpaceOf(event.get()), 1);
+        EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{0, 0, 0}));
+        // Nothing was overridden: the record is as the driver sent it.
+        EXPECT_EQ(channelsOf(event.get()), (std::array<float, 6>{1, 2, 3, 4, 5, 6}));
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, format("Unsupported database channel count (%u) for %u sensor "
+                                                           "channels \n",
+                                                           dbChannels, sensorChannels)));
+    }
+}
+
+// ---- Events passed unchanged ------------------------------------------------------------------------
+
+TEST_F(Filter, EventsWithoutRecordOrDatabasePassUnchanged)
+{
+    setLastXYZ(1, 2, 3);
+    Event bare = createALSEvent(nullptr);
+    plugin->filter(bare.get(), false);
+    EXPECT_EQ(colourSpaceOf(bare.get()), 0);
+
+    plugin->setDbReady(false);
+    Event notReady = filter(fourChannels({10, 20, 30, 40, 0, 0}, 100));
+    EXPECT_EQ(colourSpaceOf(notReady.get()), 0);
+    EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{1, 2, 3}));
+
+    // Other event types and no event at all.
+    IOHIDEventRef other = IOHIDEventCreate(kCFAllocatorDefault, kIOHIDEventTypeVendorDefined, 0, 0);
+    EXPECT_EQ(plugin->filter(other, false), other);
+    EXPECT_EQ(IOHIDEventGetIntegerValue(other, kIOHIDEventFieldAmbientLightColorSpace), 0);
+    CFRelease(other);
+    EXPECT_EQ(plugin->filter(nullptr, false), nullptr);
+}
+
+TEST_F(Filter, ShortRecordPassesUnchangedAndIsLoggedSparingly)
+{
+    setLastXYZ(1, 2, 3);
+    vt::LogCapture log(VPLogLevel::Error);
+    const Record truncated = Record(136).sampleChannelCount(4).channels({10, 20, 30, 40, 0, 0}).lux(100);
+    Event event = filter(truncated);
+    EXPECT_EQ(colourSpaceOf(event.get()), 0);
+    EXPECT_EQ(recordOf(event.get()), truncated.bytes());
+    EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{1, 2, 3}));
+
+    for (int i = 1; i < 1001; ++i)
+        filter(truncated);
+    const auto messages = log.messages();
+    ASSERT_EQ(messages.size(), 2u);
+    EXPECT_EQ(messages[0], "Sample record of 136 bytes is shorter than 137 bytes, event passed unchanged (1 so far)\n");
+    EXPECT_EQ(messages[1],
+              "Sample record of 136 bytes is shorter than 137 bytes, event passed unchanged (1001 so far)\n");
+}
+
+TEST_F(Filter, LongRecordIsReadAndWrittenOnlyWithinItsFields)
+{
+    Record longRecord = Record(200).fillFrom(137, 0xAB);
+    longRecord.sampleChannelCount(4).channels({10, 20, 30, 40, 0, 0}).lux(100).xyzInRecord(1);
+    Event event = filter(longRecord);
+    const auto bytes = recordOf(event.get());
+    ASSERT_EQ(bytes.size(), 200u);
+    EXPECT_XYZ_NEAR(xyzResultOf(event.get()), 20.0, 100.0, 80.0);
+    for (size_t i = 137; i < bytes.size(); ++i)
+        ASSERT_EQ(bytes[i], 0xAB) << i;
+}
