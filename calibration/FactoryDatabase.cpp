@@ -65,8 +65,12 @@ bool buildFromSpectra(VantishPlugIn& p, const FactorySource& source, SpectralDat
     }
     if (!extractSpectrum(p, source, m))
         return false;
-    if (LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, source.bigDBType) != 0)
+    // A reference file that cannot be read to its end builds nothing; say so,
+    // as the configuration-supplied path does.
+    if (const int code = LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, source.bigDBType); code != 0) {
+        VLOG_ERROR("Failed to parse big DB %d\n", code);
         return false;
+    }
     VLOG_DEFAULT("Parsed big DB\n");
 
     const int code = LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(),

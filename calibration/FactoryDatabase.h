@@ -32,7 +32,7 @@ struct FactorySource {
 
 // Loads or builds the database for the calibration just parsed, publishes it
 // when it is complete and usable, and hands it to the driver where the sensor
-// takes it. Holds the caller's calibration lock.
+// takes it. Runs under the caller's calibration lock.
 void finishFactoryDatabase(VantishPlugIn& plugin, const FactorySource& source, bool forceRebuild);
 
 } // namespace calib

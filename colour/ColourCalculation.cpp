@@ -24,13 +24,14 @@ struct FitSettings {
     bool normalised;   // database and measurement in unit-length, sigma-scaled form
 };
 
-// The database can be read for channelCount channels without leaving its arrays.
+// The database has samples, is made for channelCount channels (as many as
+// the fit supports), and its arrays hold what its counts promise.
 bool databaseFits(const SpectralDatabase& db, int channelCount)
 {
     size_t N = db.dbSampleCount;
     size_t M = db.dbChannelCount;
-    return N > 0 && M == size_t(channelCount) && db.dbXYZ.size() >= 3 * N && db.dbChannelResponses.size() >= M * N &&
-           (db.channelStdDev.empty() || db.channelStdDev.size() >= M);
+    return N > 0 && M == size_t(channelCount) && channelCount <= kSolverMaxChannels && db.dbXYZ.size() >= 3 * N &&
+           db.dbChannelResponses.size() >= M * N && (db.channelStdDev.empty() || db.channelStdDev.size() >= M);
 }
 
 bool allZero(const float* channels, int count)
@@ -43,9 +44,8 @@ bool allZero(const float* channels, int count)
 
 // Samples are weighed in chunks: the per-sample sums of a chunk are formed
 // channel by channel over contiguous rows, then turned into weights, both
-// loops free of branches so that they vectorise. The guards are checked once
-// per chunk; when one fires, the chunk is walked again in sample order to
-// report the first offender.
+// loops free of branches so that they vectorise. The guards are then checked
+// in sample order, so the first offender is the one reported.
 constexpr size_t kChunk = 64;
 
 struct SimilarityInput {
@@ -60,8 +60,9 @@ struct SimilarityInput {
 };
 
 struct ChunkSums {
-    double dot[kChunk];
-    double squares[kChunk];
+    double dot[kChunk];      // sample . measurement
+    double squares[kChunk];  // sample . sample
+    double distance[kChunk]; // 1 - cosine + offset
 };
 
 void sumChunk(const SimilarityInput& in, size_t start, size_t count, ChunkSums& sums)
@@ -79,41 +80,35 @@ void sumChunk(const SimilarityInput& in, size_t start, size_t count, ChunkSums& 
     }
 }
 
-double distance(const SimilarityInput& in, double dot, double product)
-{
-    return 1.0 - dot / std::sqrt(product) + in.offset;
-}
-
-// Weights of one chunk; true when a guard fires for one of its samples. The
-// exponent 2 is a product: the correctly rounded square that pow stands for,
-// without the cost of a general power.
+// The exponent 2 is a product: the correctly rounded square that pow stands
+// for, without the cost of a general power.
 template <bool Squared>
-bool chunkWeights(const SimilarityInput& in, const ChunkSums& sums, size_t count, float* weights)
+void chunkWeights(const SimilarityInput& in, ChunkSums& sums, size_t count, float* weights)
 {
-    bool fired = false;
     for (size_t k = 0; k < count; ++k) {
         double product = sums.squares[k] * in.measuredSquares;
-        double d = distance(in, sums.dot[k], product);
-        fired |= (product == 0.0) | (d == 0.0);
+        double d = 1.0 - sums.dot[k] / std::sqrt(product) + in.offset;
+        sums.distance[k] = d;
         double power = Squared ? d * d : std::pow(d, in.exponent);
         weights[k] = static_cast<float>(1.0 / power);
     }
-    return fired;
 }
 
-void reportGuard(const SimilarityInput& in, const ChunkSums& sums, size_t count)
+// Logs the first sample of the chunk for which a guard fires; false if none does.
+bool guardFired(const SimilarityInput& in, const ChunkSums& sums, size_t count)
 {
     for (size_t k = 0; k < count; ++k) {
         double product = sums.squares[k] * in.measuredSquares;
         if (product == 0.0) {
             VLOG_INFO("QiQi x QtQt == %f, can not proceed with color calculation \n", product);
-            return;
+            return true;
         }
-        if (distance(in, sums.dot[k], product) == 0.0) {
+        if (sums.distance[k] == 0.0) {
             VLOG_INFO("di+c == 0, can not proceed with color calculation \n");
-            return;
+            return true;
         }
     }
+    return false;
 }
 
 // 1 / (1 - cos(angle between measurement and sample) + c)^p for every sample,
@@ -135,28 +130,46 @@ bool similarityWeights(const SpectralDatabase& db, const float* channels, int M,
     for (size_t start = 0; start < in.N; start += kChunk) {
         size_t count = std::min(kChunk, in.N - start);
         sumChunk(in, start, count, sums);
-        bool fired = squared ? chunkWeights<true>(in, sums, count, weights + start)
-                             : chunkWeights<false>(in, sums, count, weights + start);
-        if (fired) {
-            reportGuard(in, sums, count);
+        if (squared)
+            chunkWeights<true>(in, sums, count, weights + start);
+        else
+            chunkWeights<false>(in, sums, count, weights + start);
+        if (guardFired(in, sums, count))
             return false;
-        }
     }
     return true;
+}
+
+// The largest weight, or 0 when none is above 0. Comparing the floats orders
+// them as their widened values would; four running maxima keep the loop off
+// one dependency chain and give the same answer, the maximum being the same
+// in any order.
+float largestWeight(const float* weights, size_t N)
+{
+    float lanes[4] = {};
+    size_t i = 0;
+    for (; i + 3 < N; i += 4)
+        for (int l = 0; l < 4; ++l)
+            lanes[l] = weights[i + l] > lanes[l] ? weights[i + l] : lanes[l];
+    for (; i < N; ++i)
+        lanes[0] = weights[i] > lanes[0] ? weights[i] : lanes[0];
+    float largest = lanes[0];
+    for (int l = 1; l < 4; ++l)
+        largest = lanes[l] > largest ? lanes[l] : largest;
+    return largest;
 }
 
 // Scales the weights so that the largest is 1 and puts the measurement into
 // the sigma-scaled space of the database.
 void normaliseWeightsAndMeasurement(size_t N, float* weights, float* channels, int M, const float* sigma)
 {
-    double largest = 0.0;
-    for (size_t i = 0; i < N; ++i)
-        if (double(weights[i]) > largest)
-            largest = weights[i];
-    VLOG_DEBUG("Normalization - Max WW = %f \n", largest);
-    if (largest != 0.0)
+    float largest = largestWeight(weights, N);
+    VLOG_DEBUG("Normalization - Max WW = %f \n", double(largest));
+    if (largest != 0.0f) {
+        const double divisor = largest;
         for (size_t i = 0; i < N; ++i)
-            weights[i] = static_cast<float>(weights[i] / largest);
+            weights[i] = static_cast<float>(weights[i] / divisor);
+    }
     if (sigma)
         for (int j = 0; j < M; ++j)
             if (sigma[j] != 0.0f)
@@ -217,9 +230,7 @@ bool VantishPlugIn::colourCalculationDynamic(const SpectralDatabase& db, float* 
     auto coefficients = allocateArray<float>(size_t(4) * M);
     auto transform = allocateArray<float>(size_t(3) * M);
     bool fitted = false;
-    if (M > kSolverMaxChannels) {
-        VLOG_ERROR("Color fit supports at most %d channels, got %d \n", kSolverMaxChannels, M);
-    } else if (!weights || !coefficients || !transform) {
+    if (!weights || !coefficients || !transform) {
         VLOG_ERROR("Color calculation is out of memory \n");
     } else if (similarityWeights(db, channels, M, sigma, settings, weights.get())) {
         if (settings.normalised)

@@ -1,36 +1,80 @@
 // Weighted sums over the database samples: the cross products R W T^T and the
-// packed Gram matrix R W R^T. Each element is one single-precision sum whose
-// order is fixed (eight lanes, folded as the blocks shrink), so results do not
-// depend on how the compiler vectorises the lanes.
+// packed Gram matrix R W R^T. Each element is one single-precision sum of the
+// terms (w_i * first factor) * second factor in a fixed order: eight lanes
+// (sample i in lane i mod 8) over blocks of eight, folded to four lanes for
+// blocks of four, to two for pairs, to one for a last sample. The order does
+// not depend on how the compiler vectorises the lanes.
+//
+// Several sums that share the first factor are formed in one pass, which
+// shares the products w_i * a_i and keeps independent additions in flight;
+// every sum still sees exactly its own terms in its own order.
 #include "colour/SolverSupport.h"
 
+#include <algorithm>
 #include <cstddef>
+#include <cstring>
 
 namespace {
 
-// sum over i < count of (w_i * a_i) * b_i in the fixed lane order.
-float laneSum(int count, const float* w, const float* a, const float* b)
+// Second factors handled in one pass at most.
+constexpr int kMaxShared = 4;
+
+// Four lanes, each its own single-precision sum; arithmetic on them is
+// lane by lane.
+typedef float Float4 __attribute__((vector_size(16)));
+
+Float4 load4(const float* p)
 {
-    float lanes[8] = {};
+    Float4 v;
+    std::memcpy(&v, p, sizeof v);
+    return v;
+}
+
+// out[k] = sum over i < count of (w_i * a_i) * b[k][i], for k < K.
+template <int K>
+void laneSums(int count, const float* w, const float* a, const float* const* b, float* out)
+{
+    // Lanes 0-3 and 4-7 of every sum.
+    Float4 low[K] = {}, high[K] = {};
     int i = 0;
-    for (; i + 7 < count; i += 8)
-        for (int l = 0; l < 8; ++l)
-            lanes[l] += (w[i + l] * a[i + l]) * b[i + l];
-    for (int l = 0; l < 4; ++l)
-        lanes[l] += lanes[l + 4];
-    for (; i + 3 < count; i += 4)
-        for (int l = 0; l < 4; ++l)
-            lanes[l] += (w[i + l] * a[i + l]) * b[i + l];
-    lanes[0] += lanes[2];
-    lanes[1] += lanes[3];
-    for (; i + 1 < count; i += 2) {
-        lanes[0] += (w[i] * a[i]) * b[i];
-        lanes[1] += (w[i + 1] * a[i + 1]) * b[i + 1];
+    for (; i + 7 < count; i += 8) {
+        Float4 waLow = load4(w + i) * load4(a + i);
+        Float4 waHigh = load4(w + i + 4) * load4(a + i + 4);
+        for (int k = 0; k < K; ++k) {
+            low[k] += waLow * load4(b[k] + i);
+            high[k] += waHigh * load4(b[k] + i + 4);
+        }
     }
-    lanes[0] += lanes[1];
-    if (i < count)
-        lanes[0] += (w[i] * a[i]) * b[i];
-    return lanes[0];
+    for (int k = 0; k < K; ++k)
+        low[k] += high[k];
+    for (; i + 3 < count; i += 4) {
+        Float4 wa = load4(w + i) * load4(a + i);
+        for (int k = 0; k < K; ++k)
+            low[k] += wa * load4(b[k] + i);
+    }
+    for (int k = 0; k < K; ++k) {
+        float lane0 = low[k][0] + low[k][2];
+        float lane1 = low[k][1] + low[k][3];
+        for (int j = i; j + 1 < count; j += 2) {
+            lane0 += (w[j] * a[j]) * b[k][j];
+            lane1 += (w[j + 1] * a[j + 1]) * b[k][j + 1];
+        }
+        lane0 += lane1;
+        if ((count - i) % 2 == 1)
+            lane0 += (w[count - 1] * a[count - 1]) * b[k][count - 1];
+        out[k] = lane0;
+    }
+}
+
+// The same for 1 ... kMaxShared second factors chosen at run time.
+void sharedSums(int count, const float* w, const float* a, const float* const* b, int K, float* out)
+{
+    switch (K) {
+    case 1: return laneSums<1>(count, w, a, b, out);
+    case 2: return laneSums<2>(count, w, a, b, out);
+    case 3: return laneSums<3>(count, w, a, b, out);
+    default: return laneSums<4>(count, w, a, b, out);
+    }
 }
 
 } // namespace
@@ -38,14 +82,21 @@ float laneSum(int count, const float* w, const float* a, const float* b)
 extern "C" void weightedCrossProduct(int count, int M, const float* T, int ldT, const float* w, const float* R,
                                      int ldR, float* C)
 {
+    const float* targets[3] = {T, T + ldT, T + size_t(2) * ldT};
     for (int j = 0; j < M; ++j)
-        for (int c = 0; c < 3; ++c)
-            C[4 * j + c] = laneSum(count, w, R + size_t(j) * ldR, T + size_t(c) * ldT);
+        laneSums<3>(count, w, R + size_t(j) * ldR, targets, C + 4 * j);
 }
 
 extern "C" void weightedGramPacked(int count, int M, const float* R, int ldR, const float* w, float* G)
 {
-    for (int a = 0; a < M; ++a)
-        for (int b = a; b < M; ++b)
-            G[solver::packedIndex(M, a, b)] = laneSum(count, w, R + size_t(a) * ldR, R + size_t(b) * ldR);
+    for (int a = 0; a < M; ++a) {
+        const float* first = R + size_t(a) * ldR;
+        for (int b = a; b < M; b += kMaxShared) {
+            int K = std::min(kMaxShared, M - b);
+            const float* second[kMaxShared];
+            for (int k = 0; k < K; ++k)
+                second[k] = R + size_t(b + k) * ldR;
+            sharedSums(count, w, first, second, K, G + solver::packedIndex(M, a, b));
+        }
+    }
 }

@@ -11,6 +11,10 @@ namespace host {
 
 namespace {
 
+// Event time stamps are nanoseconds in 64 bits (up to about 1.8e10 s); the
+// reader keeps a margin so that the conversion never rounds past the end.
+constexpr double kLatestTimeSeconds = 1.8e10;
+
 std::string trim(const std::string& s)
 {
     const auto begin = s.find_first_not_of(" \t\r");
@@ -264,6 +268,12 @@ std::optional<InputRow> EventReader::buildSample(const std::vector<std::pair<std
     int highestChannel = -1;
     for (const auto& [name, value] : fields) {
         if (name == "ts") {
+            // The event's time stamp counts nanoseconds in 64 bits.
+            if (!(value >= 0.0 && value < kLatestTimeSeconds)) {
+                errors.push_back({line_, name, "value " + std::to_string(value) + " is not a time from 0 to " +
+                                                   std::to_string(kLatestTimeSeconds) + " seconds"});
+                return std::nullopt;
+            }
             row.timeSeconds = value;
             continue;
         }

@@ -13,7 +13,7 @@
 //   integrationTime 100; reportInterval 100; gain 1.0 (a multiplier; stored as
 //   16.16 fixed point); cct 0; timestamp = row index; subsamples 1; mode 0;
 //   xTalk0..xTalk4 0; xyzInRecord 0; xyzSensorX/Y/Z 0; filteredLux 0;
-//   filteredLuxValid 0; ts = row index x 0.1 (event time in seconds).
+//   filteredLuxValid 0; ts = row index x 0.1 (event time in seconds, 0 to 1.8e10).
 #pragma once
 
 #include "plugin/ALSSampleRecord.h"

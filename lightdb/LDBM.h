@@ -44,8 +44,11 @@ int LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType 
 // with fewer gives SQLITE_CORRUPT.
 int LDBMParseSmallDB(int orientation, const LDBMInfo* info, float* xyz, float* responses, int responseRows);
 
-// Writes the cache file. 0; 2 when it cannot be opened; 4 when write-ahead
+// Writes the cache file: built whole beside it ("<cache>.tmp") and renamed
+// over it on success, so a failed write leaves the previous cache as it was.
+// 0; 2 when the file cannot be opened or put in place; 4 when write-ahead
 // logging cannot be switched on; 3 for a channel count other than 4 or 5 or a
-// failed RR table; otherwise the failing statement's code.
+// failed RR table; otherwise the code of the failing statement or of the final
+// checkpoint.
 int LDBMCreateSmallDB(const LDBMInfo* info, const float* xyz, const float* responses, int orientation, int algo,
                       int channelCount, unsigned chipID, float smallVersion);

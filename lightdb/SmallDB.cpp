@@ -6,7 +6,9 @@
 
 #include <os/log.h>
 
+#include <cstdio>
 #include <cstring>
+#include <mutex>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -150,6 +152,65 @@ int writeInfo(SqliteConnection& db, const LDBMInfo& info, float smallVersion, in
     return db.exec(row);
 }
 
+// ---- Replacing the cache ----------------------------------------------------------
+//
+// A new cache is built whole in a file of its own next to the cache and then
+// renamed over it. The old cache stays valid and readable until the new one is
+// complete, so a build that fails part-way (a full disk, a folder that went
+// away, an error in any statement) never costs the last good cache.
+
+std::string buildingFile(const std::string& cache) { return cache + ".tmp"; }
+
+// A database file and the companions SQLite keeps beside it.
+void removeDatabaseFiles(const std::string& file)
+{
+    for (const char* suffix : {"", "-wal", "-shm", "-journal"})
+        unlink((file + suffix).c_str());
+}
+
+// Cache writes of this process run one at a time: they share the building file.
+std::mutex& writerMutex()
+{
+    static std::mutex mutex;
+    return mutex;
+}
+
+// Writes the tables into `file`, then moves everything the write-ahead log
+// holds into the file itself, so that the file alone is the cache.
+int buildCache(const std::string& file, const LDBMInfo& info, const float* xyz, const float* responses,
+               int orientation, int algo, int channelCount, unsigned chipID, float smallVersion)
+{
+    // On the device the open also carries a platform-only flag (0x00400000)
+    // that picks the file's data-protection class; SQLite here has no such
+    // flag, so it is left out.
+    SqliteConnection db;
+    if (db.open(file, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE) != SQLITE_OK)
+        return 2;
+    if (db.exec(kWriteAheadLog) != SQLITE_OK)
+        return 4;
+
+    // The file is new; the drops only matter when a leftover could not be removed.
+    db.exec("DROP TABLE Info");
+    db.exec("DROP TABLE RR");
+    const int32_t n = info.sources;
+    if (int rc = writeResponses(db, n, responses, channelCount); rc != SQLITE_OK)
+        return rc;
+    if (int rc = writeTristimulus(db, n, xyz); rc != SQLITE_OK)
+        return rc;
+    if (int rc = writeInfo(db, info, smallVersion, orientation, algo, chipID); rc != SQLITE_OK)
+        return rc;
+    return sqlite3_wal_checkpoint_v2(db.handle(), nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+}
+
+// Renames the finished file over the cache. A log left beside the old cache
+// (by a writer that died) would be replayed into the new file; it goes first.
+int putInPlace(const std::string& building, const std::string& cache)
+{
+    unlink((cache + "-wal").c_str());
+    unlink((cache + "-shm").c_str());
+    return rename(building.c_str(), cache.c_str()) == 0 ? SQLITE_OK : 2;
+}
+
 } // namespace
 
 int LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType type, float expectedSmallVersion)
@@ -205,28 +266,15 @@ int LDBMCreateSmallDB(const LDBMInfo* info, const float* xyz, const float* respo
                       int channelCount, unsigned chipID, float smallVersion)
 {
     const std::string path = cacheFile(orientation);
+    const std::string building = buildingFile(path);
+    std::lock_guard lock(writerMutex());
     makeFolder(VPMapPath(kCacheFolder));
+    removeDatabaseFiles(building); // left by a write that never finished
 
-    // On the device the open also carries a platform-only flag (0x00400000)
-    // that picks the file's data-protection class; SQLite here has no such
-    // flag, so it is left out.
-    SqliteConnection db;
-    if (db.open(path, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE) != SQLITE_OK) {
-        unlink(path.c_str());
-        return 2;
-    }
-    if (db.exec(kWriteAheadLog) != SQLITE_OK)
-        return 4;
-
-    // Info is dropped first and written last, and every statement commits on
-    // its own: a build that stops part-way leaves a file without Info, which
-    // LDBMInitialize takes as no cache.
-    db.exec("DROP TABLE Info");
-    db.exec("DROP TABLE RR");
-    const int32_t n = info->sources;
-    if (int rc = writeResponses(db, n, responses, channelCount); rc != SQLITE_OK)
-        return rc;
-    if (int rc = writeTristimulus(db, n, xyz); rc != SQLITE_OK)
-        return rc;
-    return writeInfo(db, *info, smallVersion, orientation, algo, chipID);
+    int rc = buildCache(building, *info, xyz, responses, orientation, algo, channelCount, chipID, smallVersion);
+    if (rc == SQLITE_OK)
+        rc = putInPlace(building, path);
+    if (rc != SQLITE_OK)
+        removeDatabaseFiles(building);
+    return rc;
 }

@@ -5,6 +5,7 @@
 #include "plugin/VantishPlugIn.h"
 
 #include <algorithm>
+#include <mutex>
 #include <optional>
 
 namespace {
@@ -131,7 +132,13 @@ void rebuildDatabases(VantishPlugIn& p)
     if (!useSysConfig && p.service)
         useSysConfig = IOHIDServiceGetProperty(p.service, CFSTR("ALSCalibrationSpectrumToProcess")) == kCFBooleanTrue;
 
-    const bool rebuilt = useSysConfig ? p.processSysConfigCalibration(false, false, true) : p.loadQVTCalibration(true);
+    // The factory path reports whether the driver got its record; a rebuild
+    // has only succeeded when a new database has been published as well. The
+    // lock keeps queued calibration from publishing one in between.
+    std::lock_guard lock(p.calibrationMutex);
+    const SpectralDatabasePtr before = p.snapshotDatabase().db;
+    const bool called = useSysConfig ? p.processSysConfigCalibration(false, false, true) : p.loadQVTCalibration(true);
+    const bool rebuilt = called && p.snapshotDatabase().db != before;
     if (rebuilt)
         VLOG_INFO("Databases were rebuilt successfully.");
     else

@@ -198,11 +198,17 @@ bool VantishPlugIn::isDbReady() const
 
 // ---- Queued work ---------------------------------------------------------------------
 
+// Queued work holds the instance and the service it calibrates: the host may
+// let go of both before the work runs (a store retry can wait 100 seconds).
+
 void VantishPlugIn::dispatchRetained(dispatch_queue_t queue, std::function<void()> work)
 {
     AddRef();
-    dispatch_async(queue, [this, work = std::move(work)] {
+    CFTypeRef heldService = service ? CFRetain(service) : nullptr;
+    dispatch_async(queue, [this, heldService, work = std::move(work)] {
         work();
+        if (heldService)
+            CFRelease(heldService);
         Release();
     });
 }
@@ -210,8 +216,11 @@ void VantishPlugIn::dispatchRetained(dispatch_queue_t queue, std::function<void(
 void VantishPlugIn::dispatchAfterRetained(dispatch_time_t when, dispatch_queue_t queue, std::function<void()> work)
 {
     AddRef();
-    dispatch_after(when, queue, [this, work = std::move(work)] {
+    CFTypeRef heldService = service ? CFRetain(service) : nullptr;
+    dispatch_after(when, queue, [this, heldService, work = std::move(work)] {
         work();
+        if (heldService)
+            CFRelease(heldService);
         Release();
     });
 }

@@ -8,8 +8,8 @@
 // shared between them are atomics; the per-chip database is published whole
 // (see SpectralDatabase) and read through snapshotDatabase(). Calibration work
 // on one instance runs one piece at a time (calibrationMutex). Every queued
-// block holds a reference on the instance, so a host Release never frees an
-// instance that queued work still uses.
+// block holds a reference on the instance and on its service, so a host
+// Release never frees an instance (or the service) that queued work still uses.
 #pragma once
 
 #include "lightdb/LDBMInfo.h"
@@ -130,7 +130,7 @@ public:
     DatabaseSnapshot snapshotDatabase() const;
     bool isDbReady() const;
 
-    // ---- Queued work that keeps the instance alive --------------------------------------------
+    // ---- Queued work that keeps the instance (and its service) alive ----------------------------
     void dispatchRetained(dispatch_queue_t queue, std::function<void()> work);
     void dispatchAfterRetained(dispatch_time_t when, dispatch_queue_t queue, std::function<void()> work);
 
@@ -140,7 +140,7 @@ public:
     IOHIDServiceFilterPlugInInterface* interfaceTable; // first: the instance is its interface pointer
     CFUUIDRef factoryID;
     std::atomic<uint32_t> refCount;
-    IOHIDServiceRef service = nullptr;  // not retained
+    IOHIDServiceRef service = nullptr;  // not retained; queued work retains it while it waits
     io_service_t registryEntry = 0;     // released with the instance
     std::atomic<uint32_t> orientation{1};
     std::atomic<uint8_t> algoVersion{0};

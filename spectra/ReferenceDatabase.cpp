@@ -79,6 +79,20 @@ void insertSources(sqlite3* db, const std::vector<const Source*>& sources)
     }
 }
 
+// The name of every source, so that tools can tell the sources and their
+// families apart; the plug-in reads only Info and Spectra.
+void insertNames(sqlite3* db, const std::vector<const Source*>& sources)
+{
+    const Statement insert = prepare(db, "INSERT INTO Names VALUES (?, ?)");
+    sqlite3_stmt* raw = insert.get();
+    for (size_t id = 0; id < sources.size(); ++id) {
+        sqlite3_bind_int(raw, 1, int(id));
+        sqlite3_bind_text(raw, 2, sources[id]->name.c_str(), -1, SQLITE_TRANSIENT);
+        check(db, sqlite3_step(raw), "insert name");
+        check(db, sqlite3_reset(raw), "reset insert");
+    }
+}
+
 void removeIfPresent(const std::filesystem::path& p)
 {
     std::error_code ignored;
@@ -107,6 +121,8 @@ void writeReferenceDatabase(const std::string& path, float version, const std::v
         insertInfo(raw, version, int(sources.size()));
         exec(raw, spectraTableSql());
         insertSources(raw, sources);
+        exec(raw, "CREATE TABLE Names (ID INTEGER PRIMARY KEY, name TEXT)");
+        insertNames(raw, sources);
         exec(raw, "COMMIT");
         exec(raw, "VACUUM");
         if (sqlite3_close(db.release()) != SQLITE_OK) throw std::runtime_error(temporary.string() + ": close failed");

@@ -2,7 +2,9 @@
 //
 // Layout: table Info (version REAL, sources INTEGER, columns INTEGER, samples
 // INTEGER), one row; table Spectra (ID INTEGER PRIMARY KEY, X, Y, Z, S0 .. S400
-// all REAL), one row per source with IDs 0 .. N−1 in set order. The plug-in reads
+// all REAL), one row per source with IDs 0 .. N−1 in set order; table Names
+// (ID INTEGER PRIMARY KEY, name TEXT), the source names for tools, which the
+// plug-in does not read. The plug-in reads
 // every value as text through sqlite3_exec and converts it with atof to float,
 // so every REAL is stored as a value already rounded to float: SQLite's
 // 15-significant-digit text of such a value converts back to that same float.

@@ -3,7 +3,9 @@
 #include "plugin/LittleEndian.h"
 
 #include <cmath>
+#include <algorithm>
 #include <cstdio>
+#include <cstring>
 #include <limits>
 #include <stdexcept>
 

@@ -20,6 +20,11 @@ struct CommonOptions {
 using Runner = std::function<int()>;
 Runner addOpenCommand(CLI::App& app, const CommonOptions& common);
 Runner addRunCommand(CLI::App& app, const CommonOptions& common);
+Runner addCalibCommand(CLI::App& app, const CommonOptions& common);
+Runner addSynthCommand(CLI::App& app, const CommonOptions& common);
+Runner addEvalCommand(CLI::App& app, const CommonOptions& common);
+Runner addDemoCommand(CLI::App& app, const CommonOptions& common);
+Runner addLightdbCommand(CLI::App& app, const CommonOptions& common);
 
 // The built-in sample device used when no device is named.
 std::string defaultDevice();

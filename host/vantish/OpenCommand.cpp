@@ -3,6 +3,7 @@
 #include "host/vantish/Commands.h"
 
 #include "host/Bundle.h"
+#include "host/DriverSample.h"
 #include "host/DataFolder.h"
 #include "host/PlugInSession.h"
 #include "host/Unit.h"
@@ -99,6 +100,22 @@ int runOpen(const CommonOptions& common, const OpenOptions& options)
         printDriverProperty(unit, "ALSCalibrationData");
         printDriverProperty(unit, "ALSColorCalibration");
         printDriverProperty(unit, "crgb");
+
+        // A client sees colour only once the per-chip database is ready: the
+        // filter then marks every ALS event with a colour space.
+        ALSSampleRecord probe;
+        probe.sampleChannelCount = 6;
+        probe.sampleOrientation = 1;
+        probe.lux = probe.rawLux = 100.0f;
+        probe.channelValues.fill(1000.0f);
+        IOHIDEventRef event = host::createALSEvent(probe, 0);
+        session.filter(event);
+        const bool colour = IOHIDEventGetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace) != 0;
+        CFRelease(event);
+        VPLogTakeCaptured();
+        std::cout << "colour  " << (colour ? "on: the per-chip database is ready (dbReady)"
+                                           : "off: no per-chip database (dbReady is 0)")
+                  << "\n";
         VPLogStopCapture();
         return 0;
     } catch (const std::exception& e) {
@@ -109,7 +126,7 @@ int runOpen(const CommonOptions& common, const OpenOptions& options)
 
 } // namespace
 
-std::string defaultDevice() { return (host::dataFolder() / "devices" / "basic-rgbc" / "device.json").string(); }
+std::string defaultDevice() { return (host::dataFolder() / "devices" / "xwca-t2" / "device.json").string(); }
 
 Runner addOpenCommand(CLI::App& app, const CommonOptions& common)
 {

@@ -1,5 +1,6 @@
 // vantish run DEVICE: feed light samples through the plug-in on a unit, as the
 // driver and the event system would, and print the colour clients receive.
+#include "host/vantish/ClientColour.h"
 #include "host/vantish/Commands.h"
 #include "host/vantish/OpenedUnit.h"
 
@@ -24,34 +25,6 @@ struct RunOptions {
     std::vector<std::string> sets;
 };
 
-// The colour of one event as clients receive it.
-struct Result {
-    std::string index; // the sample's number, or "copy"
-    double lux = 0, X = 0, Y = 0, Z = 0;
-    long colorSpace = 0;
-    bool spike = false;
-};
-
-Result readResult(IOHIDEventRef event, const ALSSampleRecord& input)
-{
-    Result r;
-    r.lux = IOHIDEventGetFloatValue(event, kIOHIDEventFieldAmbientLightSensorLevel);
-    r.colorSpace = IOHIDEventGetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace);
-    r.X = IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent0);
-    r.Y = IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent1);
-    r.Z = IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent2);
-    if (input.xyzInRecord) {
-        // The colour went into the driver's record instead of the event's fields.
-        if (auto xyz = host::readXYZResult(event)) {
-            r.X = (*xyz)[0];
-            r.Y = (*xyz)[1];
-            r.Z = (*xyz)[2];
-        }
-    }
-    r.spike = input.lux > 0 && r.lux == 0 && r.X == 0 && r.Y == 0 && r.Z == 0;
-    return r;
-}
-
 class Printer {
 public:
     Printer(std::ostream& out, bool json) : out_(out), json_(json)
@@ -59,12 +32,14 @@ public:
         if (!json_)
             out_ << "index,lux,X,Y,Z,x,y,u_prime,v_prime,cct,colorSpace,spike\n";
     }
-    void print(const Result& r)
+    void print(const ClientColour& r)
     {
         const spectra::Xy xy = spectra::chromaticity({r.X, r.Y, r.Z});
         const bool hasColour = r.X + r.Y + r.Z > 0;
         const spectra::Uv uv = spectra::uvPrime(xy);
-        const auto cct = hasColour ? spectra::correlatedColourTemperature(xy) : std::nullopt;
+        const auto cctEstimate = hasColour ? spectra::correlatedColourTemperature(xy) : std::nullopt;
+        const bool hasCct = cctEstimate.has_value();
+        const double cct = cctEstimate.value_or(0.0);
         std::ostringstream line;
         line << std::setprecision(6);
         if (json_) {
@@ -76,7 +51,7 @@ public:
                 j["u_prime"] = uv.u;
                 j["v_prime"] = uv.v;
             }
-            j["cct"] = cct ? nlohmann::json(*cct) : nlohmann::json(nullptr);
+            j["cct"] = hasCct ? nlohmann::json(cct) : nlohmann::json(nullptr);
             out_ << j.dump() << "\n";
             return;
         }
@@ -85,8 +60,8 @@ public:
             line << std::fixed << std::setprecision(4) << xy.x << ',' << xy.y << ',' << uv.u << ',' << uv.v << ',';
         else
             line << ",,,,";
-        if (cct)
-            line << std::fixed << std::setprecision(0) << *cct;
+        if (hasCct)
+            line << std::fixed << std::setprecision(0) << cct;
         line << ',' << r.colorSpace << ',' << (r.spike ? 1 : 0);
         out_ << line.str() << "\n";
     }
@@ -101,6 +76,12 @@ bool setProperty(OpenedUnit& opened, const std::string& key, const nlohmann::jso
     try {
         CFTypeRef cfValue = clientPropertyValue(value);
         CFStringRef cfKey = CFStringCreateWithCString(nullptr, key.c_str(), kCFStringEncodingUTF8);
+        // A property key is a CF string: text that is not UTF-8 cannot be one.
+        if (!cfKey) {
+            CFRelease(cfValue);
+            error = "the key is not UTF-8 text";
+            return false;
+        }
         opened.session->setProperty(cfKey, cfValue);
         CFRelease(cfKey);
         CFRelease(cfValue);
@@ -154,7 +135,7 @@ int runEvents(const CommonOptions& common, const RunOptions& options)
     Printer printer(std::cout, options.format == "jsonl");
     host::EventReader reader(*in, format, opened->channelCount());
     std::vector<host::InputError> errors;
-    size_t samples = 0, failed = 0;
+    size_t samples = 0, failed = 0, rows = 0;
     IOHIDEventRef lastDriverEvent = nullptr; // the service's current event, for copies
     ALSSampleRecord lastRecord;
     auto reportErrors = [&] {
@@ -166,6 +147,7 @@ int runEvents(const CommonOptions& common, const RunOptions& options)
 
     while (auto row = reader.next(errors)) {
         reportErrors();
+        ++rows;
         switch (row->kind) {
         case host::InputRow::Kind::SetProperty: {
             std::string error;
@@ -180,7 +162,7 @@ int runEvents(const CommonOptions& common, const RunOptions& options)
             }
             IOHIDEventRef copy = IOHIDEventCreateCopy(kCFAllocatorDefault, lastDriverEvent);
             opened->session->copyEvent(copy);
-            Result r = readResult(copy, lastRecord);
+            ClientColour r = readClientColour(copy, lastRecord);
             r.index = "copy";
             printer.print(r);
             CFRelease(copy);
@@ -194,7 +176,7 @@ int runEvents(const CommonOptions& common, const RunOptions& options)
             lastDriverEvent = IOHIDEventCreateCopy(kCFAllocatorDefault, event);
             lastRecord = row->record;
             opened->session->filter(event);
-            Result r = readResult(event, row->record);
+            ClientColour r = readClientColour(event, row->record);
             r.index = std::to_string(samples++);
             printer.print(r);
             CFRelease(event);
@@ -207,6 +189,10 @@ int runEvents(const CommonOptions& common, const RunOptions& options)
     if (lastDriverEvent)
         CFRelease(lastDriverEvent);
     std::cout.flush();
+    if (rows == 0 && failed == 0) {
+        std::cerr << "vantish: " << source << ": no samples (the input is empty or only a header)\n";
+        return 1;
+    }
     if (samples == 0 && failed > 0)
         return 1; // nothing could be done
     return 0;

@@ -15,7 +15,7 @@ int main(int argc, char** argv)
     CLI::App app{"vantish - run the Vantish colour ambient-light filter plug-in on a unit.\n\n"
                  "The plug-in bundle is loaded through its registration as the HID event system loads it,\n"
                  "opened on a unit described in JSON, and fed ambient-light events. With no command,\n"
-                 "vantish opens the built-in sample unit and shows what the plug-in did.",
+                 "vantish runs the demo: the built-in sample unit evaluated against the built-in test lights.",
                  "vantish"};
     vantish::CommonOptions common;
     common.bundle = host::defaultBundleFolder();
@@ -25,6 +25,7 @@ int main(int argc, char** argv)
     app.add_option("--log", common.logLevel, "Also print the plug-in's log at this level: off, error, default, info, debug")
         ->check(CLI::IsMember({"off", "error", "default", "info", "debug"}));
     app.require_subcommand(0, 1);
+    app.set_help_all_flag("--help-all", "Print the help of every command and exit");
 
     std::map<CLI::App*, vantish::Runner> runners;
     auto add = [&](const char* name, const char* help, auto&& adder) {
@@ -35,14 +36,22 @@ int main(int argc, char** argv)
         vantish::addOpenCommand);
     add("run", "Feed light samples through the plug-in on a unit and print the colour clients receive",
         vantish::addRunCommand);
+    add("calib", "Decode calibration records to JSON and encode them back", vantish::addCalibCommand);
+    add("synth", "Synthesise the samples a unit's sensor would report under a light (CSV for run)",
+        vantish::addSynthCommand);
+    add("eval", "Measure the plug-in's colour accuracy on a unit over a set of lights, beside a global matrix",
+        vantish::addEvalCommand);
+    add("demo", "Evaluate the built-in sample unit against the built-in test lights and write a report",
+        vantish::addDemoCommand);
+    add("lightdb", "Inspect light database files", vantish::addLightdbCommand);
 
     CLI11_PARSE(app, argc, argv);
 
     for (auto& [sub, run] : runners)
         if (sub->parsed())
             return run();
-    // No command: the built-in sample unit.
+    // No command: the demonstration.
     CLI::App defaultApp;
-    auto run = vantish::addOpenCommand(defaultApp, common);
+    auto run = vantish::addDemoCommand(defaultApp, common);
     return run();
 }

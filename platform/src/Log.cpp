@@ -15,6 +15,7 @@
 #include <deque>
 #include <mutex>
 #include <string>
+#include <string_view>
 #include <strings.h>
 #include <utility>
 #include <vector>
@@ -78,12 +79,19 @@ public:
     std::atomic<bool> echo{true};
     std::atomic<bool> createFails{false};
 
+    // One handle per subsystem and category, as the system's log keeps them: a
+    // host that creates and releases plug-in instances all day does not grow.
     os_log_t create(const char* subsystem, const char* category)
     {
         std::lock_guard lock(mutex_);
+        const std::string_view wantedSubsystem = subsystem ? subsystem : "";
+        const std::string_view wantedCategory = category ? category : "";
+        for (CreatedLog& log : created_)
+            if (log.subsystem == wantedSubsystem && log.category == wantedCategory)
+                return &log.handle;
         CreatedLog& log = created_.emplace_back();
-        log.subsystem = subsystem ? subsystem : "";
-        log.category = category ? category : "";
+        log.subsystem = wantedSubsystem;
+        log.category = wantedCategory;
         log.handle = {log.subsystem.c_str(), log.category.c_str()};
         return &log.handle;
     }

@@ -34,3 +34,13 @@ void vvsqrtf(float* y, const float* x, const int* n)
     for (int i = 0; i < *n; ++i)
         y[i] = std::sqrt(x[i]);
 }
+
+namespace {
+// BLAS runs on the caller's thread. The plug-in's solves are small and are
+// entered from several queues at once; OpenBLAS's own thread pool would only
+// oversubscribe the cores (and hides the calls from thread checkers).
+const bool singleThreadedBlas = [] {
+    openblas_set_num_threads(1);
+    return true;
+}();
+} // namespace

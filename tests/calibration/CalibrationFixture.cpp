@@ -4,13 +4,13 @@
 
 namespace ct {
 
-Bytes makeXwCl(const XwClSpec& spec)
+Bytes makeXwCl(const XwClShape& shape)
 {
-    Bytes b(76 + 5080 * spec.entries);
-    b.u8(4, 2).u8(5, 3).u8(10, spec.selector).u32(12, spec.chipID).u8(16, spec.deviceID).u8(74, spec.chipType);
-    for (unsigned k = 0; k < spec.entries; ++k) {
+    Bytes b(76 + 5080 * shape.entries);
+    b.u8(4, 2).u8(5, 3).u8(10, shape.selector).u32(12, shape.chipID).u8(16, shape.deviceID).u8(74, shape.chipType);
+    for (unsigned k = 0; k < shape.entries; ++k) {
         const size_t e = 76 + 5080 * k;
-        b.u8(e + 4, spec.nChannels).u8(e + 5, spec.nGains);
+        b.u8(e + 4, shape.nChannels).u8(e + 5, shape.nGains);
         b.u16(e + 6, xwcl::iTime(k)).u16(e + 8, xwcl::aux1(k)).u16(e + 10, xwcl::aux2(k)).u16(e + 12, xwcl::aux3(k));
         for (unsigned i = 0; i < 4; ++i)
             b.u8(e + 14 + i, xwcl::gain(k, i));
@@ -31,11 +31,11 @@ Bytes makeXwCl(const XwClSpec& spec)
     return b;
 }
 
-Bytes makeXwCA(const XwCASpec& spec)
+Bytes makeXwCA(const XwCAShape& shape)
 {
     Bytes b(9962);
-    b.u8(4, spec.major).u8(5, spec.minor).text(16, spec.chipText).u8(28, spec.deviceID);
-    b.u8(80, spec.nChannels).u8(81, spec.nGains).u16(82, spec.fudge);
+    b.u8(4, shape.major).u8(5, shape.minor).text(16, shape.chipText).u8(28, shape.deviceID);
+    b.u8(80, shape.nChannels).u8(81, shape.nGains).u16(82, shape.fudge);
     for (unsigned c = 0; c < 5; ++c) {
         for (unsigned g = 0; g < 9; ++g)
             b.u16(84 + 18 * c + 2 * g, xwca::gainScale(c, g));
@@ -46,7 +46,7 @@ Bytes makeXwCA(const XwCASpec& spec)
         b.i32(234 + 4 * c, xwca::lux(c));
         b.i32(258 + 4 * c, xwca::cct(c));
     }
-    b.u8(282, spec.gainIndex).i16(284, spec.iTime);
+    b.u8(282, shape.gainIndex).i16(284, shape.iTime);
     for (unsigned c = 0; c < 6; ++c)
         for (unsigned s = 0; s < 401; ++s)
             b.i32(338 + 1604 * c + 4 * s, xwca::sample(c, s));

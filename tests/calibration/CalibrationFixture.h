@@ -99,7 +99,7 @@ inline std::string firstDifference(const std::vector<uint8_t>& got, const std::v
 // ---- Factory records, every field from a formula of its indexes -------------------
 
 // XwCl: entry k, channel c (all six stored), gain g (all nine stored), sample s.
-struct XwClSpec {
+struct XwClShape {
     unsigned entries = 1;
     uint8_t deviceID = 14;
     uint32_t chipID = 0;
@@ -124,10 +124,10 @@ inline int32_t lux(unsigned k, unsigned c) { return int32_t(65536 * (c + 1) + 40
 inline int32_t cct(unsigned k, unsigned c) { return -int32_t(1000 * (c + 1) + k); }
 inline int16_t sample(unsigned k, unsigned c, unsigned s) { return int16_t(int((s * 3 + c * 11 + k * 5) % 250) - 40); }
 } // namespace xwcl
-Bytes makeXwCl(const XwClSpec& spec);
+Bytes makeXwCl(const XwClShape& shape);
 
 // XwCA T2: channel c (all six stored spectra, five coefficient slots), gain g.
-struct XwCASpec {
+struct XwCAShape {
     uint8_t major = 1;
     uint8_t minor = 7;
     std::string chipText = "1A2B3C4D";
@@ -148,7 +148,7 @@ inline int32_t lux(unsigned c) { return int32_t(c + 1) * 0x01000000; }
 inline int32_t cct(unsigned c) { return -int32_t(c + 1) * 16384 * 3; }
 inline int32_t sample(unsigned c, unsigned s) { return int32_t(s) * 1000 - int32_t(c) * 77777; }
 } // namespace xwca
-Bytes makeXwCA(const XwCASpec& spec);
+Bytes makeXwCA(const XwCAShape& shape);
 
 // VD6287 version 3: blob k, channel j, gain g, table entry m, spectrum c.
 namespace vd {

@@ -5,7 +5,7 @@
 namespace {
 
 using ct::Bytes;
-using ct::XwCASpec;
+using ct::XwCAShape;
 namespace v = ct::xwca;
 
 class XwCAT2FormatTest : public ct::CalibrationTest {
@@ -15,14 +15,14 @@ protected:
         CalibrationTest::SetUp();
         plugin->chipId = 0x1A2B3C4D;
     }
-    bool load(const XwCASpec& spec)
+    bool load(const XwCAShape& shape)
     {
-        writeStore("XwCA", ct::makeXwCA(spec).vec());
+        writeStore("XwCA", ct::makeXwCA(shape).vec());
         return plugin->loadQVTCalibration(false);
     }
 };
 
-Bytes expectedRecord(const XwCASpec& s, unsigned gain, unsigned iTime, unsigned fudge)
+Bytes expectedRecord(const XwCAShape& s, unsigned gain, unsigned iTime, unsigned fudge)
 {
     Bytes b(193);
     b.u8(0, 1).u32(1, 2).u32(5, 0).u8(9, 1).u16(10, 193);
@@ -42,10 +42,10 @@ Bytes expectedRecord(const XwCASpec& s, unsigned gain, unsigned iTime, unsigned 
 
 TEST_F(XwCAT2FormatTest, VersionAbove16TakesTimingFromTheRecord)
 {
-    const XwCASpec spec; // version 1.7, gain index 12 with 5 gains, iTime 180
+    const XwCAShape shape; // version 1.7, gain index 12 with 5 gains, iTime 180
     VPTessarySetProductType(stored::xwca::kProductTypeWithTimingFault + 1);
-    ASSERT_TRUE(load(spec));
-    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(spec, 12 - 5 + 9, 180, 0x4100).vec());
+    ASSERT_TRUE(load(shape));
+    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(shape, 12 - 5 + 9, 180, 0x4100).vec());
     EXPECT_FLOAT_EQ(plugin->smallDBVersion.load(), 1.3f);
     EXPECT_EQ(plugin->numberOfChannels.load(), 5u);
     EXPECT_EQ(plugin->dbChannelCount.load(), 5u);
@@ -57,20 +57,20 @@ TEST_F(XwCAT2FormatTest, VersionAbove16TakesTimingFromTheRecord)
 
 TEST_F(XwCAT2FormatTest, Version16UsesFixedTiming)
 {
-    const XwCASpec spec{.major = 1, .minor = 6, .nGains = 3, .gainIndex = 200, .iTime = -7};
-    ASSERT_TRUE(load(spec));
-    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(spec, 6, 150, 0x4100).vec());
+    const XwCAShape shape{.major = 1, .minor = 6, .nGains = 3, .gainIndex = 200, .iTime = -7};
+    ASSERT_TRUE(load(shape));
+    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(shape, 6, 150, 0x4100).vec());
 }
 
 TEST_F(XwCAT2FormatTest, Version17OfTheFaultyModelGetsCorrectedTiming)
 {
     VPTessarySetProductType(stored::xwca::kProductTypeWithTimingFault);
-    const XwCASpec spec;
-    ASSERT_TRUE(load(spec));
-    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(spec, 16, 250, 0x4CCC).vec());
+    const XwCAShape shape;
+    ASSERT_TRUE(load(shape));
+    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(shape, 16, 250, 0x4CCC).vec());
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "WORKAROUND: override iTime (180 -> 250) and fudge (16640 -> 19660)"));
 
-    const XwCASpec later{.minor = 8};
+    const XwCAShape later{.minor = 8};
     ASSERT_TRUE(load(later));
     EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(later, 16, 180, 0x4100).vec());
 }
@@ -91,9 +91,9 @@ TEST_F(XwCAT2FormatTest, ChipIdIsReadAsHexadecimalText)
 
 TEST_F(XwCAT2FormatTest, CountsBeyondTheRecordAreRejected)
 {
-    for (const XwCASpec& spec : {XwCASpec{.nChannels = 6}, XwCASpec{.nGains = 6}, XwCASpec{.nChannels = 0}}) {
+    for (const XwCAShape& shape : {XwCAShape{.nChannels = 6}, XwCAShape{.nGains = 6}, XwCAShape{.nChannels = 0}}) {
         plugin->numberOfChannels = 3;
-        EXPECT_FALSE(load(spec));
+        EXPECT_FALSE(load(shape));
         EXPECT_TRUE(received("ALSCalibrationData").empty());
         EXPECT_EQ(plugin->numberOfChannels.load(), 3u);
     }

@@ -5,14 +5,14 @@
 namespace {
 
 using ct::Bytes;
-using ct::XwClSpec;
+using ct::XwClShape;
 namespace v = ct::xwcl;
 
 class XwClFormatTest : public ct::CalibrationTest {
 protected:
-    bool load(const XwClSpec& spec)
+    bool load(const XwClShape& shape)
     {
-        writeStore("XwCl", ct::makeXwCl(spec).vec());
+        writeStore("XwCl", ct::makeXwCl(shape).vec());
         return plugin->loadQVTCalibration(false);
     }
 };
@@ -38,7 +38,7 @@ void block(Bytes& b, size_t at, unsigned k, unsigned c, unsigned nGains, bool wi
         b.u16(at + (wide ? 7 : 6) + 2 * g, v::gainScale(k, c, g));
 }
 
-Bytes fiveChannelRecord(const XwClSpec& s, unsigned k)
+Bytes fiveChannelRecord(const XwClShape& s, unsigned k)
 {
     Bytes b = header(193, s.chipType, k);
     b.u16(20, v::aux3(k));
@@ -52,7 +52,7 @@ Bytes fiveChannelRecord(const XwClSpec& s, unsigned k)
     return b;
 }
 
-Bytes fourChannelRecord(const XwClSpec& s, unsigned k)
+Bytes fourChannelRecord(const XwClShape& s, unsigned k)
 {
     Bytes b = header(145, 0, k);
     for (unsigned i = 0; i < 3; ++i)
@@ -66,7 +66,7 @@ Bytes fourChannelRecord(const XwClSpec& s, unsigned k)
     return b;
 }
 
-Bytes sixChannelRecord(const XwClSpec& s, unsigned k)
+Bytes sixChannelRecord(const XwClShape& s, unsigned k)
 {
     Bytes b = header(220, s.chipType, k);
     b.u16(20, v::aux3(k));
@@ -85,11 +85,11 @@ TEST_F(XwClFormatTest, FiveChannelRecordComesFromTheFirstEntry)
 {
     for (uint8_t device : {uint8_t(14), uint8_t(19)}) {
         SCOPED_TRACE(int(device));
-        const XwClSpec spec{.entries = 2, .deviceID = device, .chipID = 0x11223344, .chipType = 1, .selector = 2,
+        const XwClShape shape{.entries = 2, .deviceID = device, .chipID = 0x11223344, .chipType = 1, .selector = 2,
                             .nChannels = 4, .nGains = 7};
         plugin->chipId = 0x11223344;
-        ASSERT_TRUE(load(spec));
-        EXPECT_BYTES_EQ(received("ALSCalibrationData"), fiveChannelRecord(spec, 0).vec());
+        ASSERT_TRUE(load(shape));
+        EXPECT_BYTES_EQ(received("ALSCalibrationData"), fiveChannelRecord(shape, 0).vec());
         EXPECT_FLOAT_EQ(plugin->smallDBVersion.load(), 1.3f);
         EXPECT_EQ(plugin->chipType.load(), 1u);
         EXPECT_EQ(plugin->numberOfChannels.load(), 4u);
@@ -107,11 +107,11 @@ TEST_F(XwClFormatTest, FourChannelRecordComesFromTheSelectedEntry)
 {
     for (uint8_t device : {uint8_t(35), uint8_t(58)}) {
         SCOPED_TRACE(int(device));
-        const XwClSpec spec{.entries = 2, .deviceID = device, .chipType = 2, .selector = 2, .nChannels = 4,
+        const XwClShape shape{.entries = 2, .deviceID = device, .chipType = 2, .selector = 2, .nChannels = 4,
                             .nGains = 8};
         plugin->chipType = 7;
-        ASSERT_TRUE(load(spec));
-        EXPECT_BYTES_EQ(received("ALSCalibrationData"), fourChannelRecord(spec, 1).vec());
+        ASSERT_TRUE(load(shape));
+        EXPECT_BYTES_EQ(received("ALSCalibrationData"), fourChannelRecord(shape, 1).vec());
         EXPECT_EQ(plugin->algoVersion.load(), 4);
         EXPECT_EQ(plugin->lambdaConfigured.load(), 1);
         EXPECT_FLOAT_EQ(plugin->lambda.load(), 0.01f);
@@ -126,10 +126,10 @@ TEST_F(XwClFormatTest, SixChannelRecordScalesColourTemperatureByChipType)
 {
     for (uint8_t chipType : {uint8_t(0), uint8_t(1)}) {
         SCOPED_TRACE(int(chipType));
-        const XwClSpec spec{.entries = 1, .deviceID = 62, .chipType = chipType, .selector = 1, .nChannels = 6,
+        const XwClShape shape{.entries = 1, .deviceID = 62, .chipType = chipType, .selector = 1, .nChannels = 6,
                             .nGains = 9};
-        ASSERT_TRUE(load(spec));
-        EXPECT_BYTES_EQ(received("ALSCalibrationData"), sixChannelRecord(spec, 0).vec());
+        ASSERT_TRUE(load(shape));
+        EXPECT_BYTES_EQ(received("ALSCalibrationData"), sixChannelRecord(shape, 0).vec());
         EXPECT_FLOAT_EQ(plugin->smallDBVersion.load(), 1.2f);
         EXPECT_EQ(plugin->chipType.load(), chipType);
         EXPECT_EQ(plugin->numberOfChannels.load(), 6u);
@@ -139,10 +139,10 @@ TEST_F(XwClFormatTest, SixChannelRecordScalesColourTemperatureByChipType)
 
 TEST_F(XwClFormatTest, ChipIdMatchesInEitherByteOrder)
 {
-    const XwClSpec spec{.deviceID = 14, .chipID = 0x11223344};
+    const XwClShape shape{.deviceID = 14, .chipID = 0x11223344};
     for (uint32_t sensor : {0x11223344u, 0x44332211u}) {
         plugin->chipId = sensor;
-        EXPECT_TRUE(load(spec)) << std::hex << sensor;
+        EXPECT_TRUE(load(shape)) << std::hex << sensor;
     }
     plugin->chipId = 0;
     EXPECT_TRUE(load({.deviceID = 14, .chipID = 0}));
@@ -164,7 +164,7 @@ TEST_F(XwClFormatTest, ChipIdMismatchClearsDbReadyAndSendsNothing)
 
 TEST_F(XwClFormatTest, RecordsThatDoNotFitTheirLayoutAreRejected)
 {
-    const XwClSpec rejected[] = {
+    const XwClShape rejected[] = {
         {.entries = 1, .deviceID = 62, .selector = 0, .nChannels = 6},  // selector names no entry
         {.entries = 2, .deviceID = 35, .selector = 3, .nChannels = 4},  // past the second entry
         {.entries = 1, .deviceID = 58, .selector = 2, .nChannels = 4},  // one entry only
@@ -176,12 +176,12 @@ TEST_F(XwClFormatTest, RecordsThatDoNotFitTheirLayoutAreRejected)
         {.entries = 1, .deviceID = 14, .selector = 1, .nChannels = 5, .nGains = 10},
         {.entries = 1, .deviceID = 20, .selector = 1, .nChannels = 5}, // unknown device
     };
-    for (const XwClSpec& spec : rejected) {
-        SCOPED_TRACE(testing::Message() << "device " << int(spec.deviceID) << " selector " << int(spec.selector)
-                                        << " channels " << int(spec.nChannels) << " gains " << int(spec.nGains));
+    for (const XwClShape& shape : rejected) {
+        SCOPED_TRACE(testing::Message() << "device " << int(shape.deviceID) << " selector " << int(shape.selector)
+                                        << " channels " << int(shape.nChannels) << " gains " << int(shape.nGains));
         log.clear();
         plugin->numberOfChannels = 3;
-        EXPECT_FALSE(load(spec));
+        EXPECT_FALSE(load(shape));
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to parse ALS calibration data."));
         EXPECT_TRUE(received("ALSCalibrationData").empty());
         EXPECT_EQ(plugin->numberOfChannels.load(), 3u);

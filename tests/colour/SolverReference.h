@@ -2,8 +2,13 @@
 // independent double-precision answers for them.
 #pragma once
 
-#include <Eigen/Dense>
+#include "colour/Solvers.h"
 
+#include <Eigen/Dense>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <cmath>
 #include <random>
 #include <vector>
 
@@ -109,6 +114,40 @@ inline double relativeError(const Eigen::MatrixXd& got, const Eigen::MatrixXd& w
 {
     double scale = std::max(want.cwiseAbs().maxCoeff(), 1e-30);
     return (got - want).cwiseAbs().maxCoeff() / scale;
+}
+
+using Unregularised = void (*)(int, int, const float*, const float*, const float*, float*);
+using Regularised = void (*)(int, int, const float*, const float*, const float*, float*, float);
+
+// What a result element holds when the solver did not write it.
+constexpr float kUnset = -12345.0f;
+
+// Runs one solver and checks that it left the caller's arrays alone.
+template <typename Call>
+std::vector<float> runChecked(const Problem& p, Call call)
+{
+    Problem before = p;
+    std::vector<float> H(size_t(4) * std::max(p.M, 0), kUnset);
+    call(H.data());
+    EXPECT_EQ(p.T, before.T);
+    EXPECT_EQ(p.w, before.w);
+    EXPECT_EQ(p.R, before.R);
+    return H;
+}
+
+inline std::vector<float> run(Regularised solver, const Problem& p, float lambda)
+{
+    return runChecked(p, [&](float* H) { solver(p.N, p.M, p.T.data(), p.w.data(), p.R.data(), H, lambda); });
+}
+
+inline std::vector<float> run(Unregularised solver, const Problem& p)
+{
+    return runChecked(p, [&](float* H) { solver(p.N, p.M, p.T.data(), p.w.data(), p.R.data(), H); });
+}
+
+inline bool allNaN(const std::vector<float>& H)
+{
+    return std::all_of(H.begin(), H.end(), [](float v) { return std::isnan(v); });
 }
 
 } // namespace colourtest

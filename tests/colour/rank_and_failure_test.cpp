@@ -11,26 +11,6 @@ using namespace colourtest;
 
 namespace {
 
-std::vector<float> solve(void (*solver)(int, int, const float*, const float*, const float*, float*), const Problem& p)
-{
-    std::vector<float> H(size_t(4) * p.M, -1.0f);
-    solver(p.N, p.M, p.T.data(), p.w.data(), p.R.data(), H.data());
-    return H;
-}
-
-std::vector<float> solve(void (*solver)(int, int, const float*, const float*, const float*, float*, float),
-                         const Problem& p, float lambda)
-{
-    std::vector<float> H(size_t(4) * p.M, -1.0f);
-    solver(p.N, p.M, p.T.data(), p.w.data(), p.R.data(), H.data(), lambda);
-    return H;
-}
-
-bool allNaN(const std::vector<float>& H)
-{
-    return std::all_of(H.begin(), H.end(), [](float v) { return std::isnan(v); });
-}
-
 void zeroChannel(Problem& p, int j) { std::fill_n(p.R.begin() + size_t(j) * p.N, p.N, 0.0f); }
 
 Problem withoutChannels(const Problem& p, std::vector<int> dropped)
@@ -68,7 +48,7 @@ TEST(RankDeficient, EmptyChannelsGetZeroAndTheRestTheirOwnFit)
         Eigen::MatrixXd want = closedForm(reduced, 0.0);
         // hybridSolve finds the factor broken and falls back to QR.
         for (auto solver : {hybridSolve, generalSolve}) {
-            std::vector<float> H = solve(solver, p);
+            std::vector<float> H = run(solver, p);
             int row = 0;
             for (int j = 0; j < c.M; ++j) {
                 bool isEmpty = std::find(c.empty.begin(), c.empty.end(), j) != c.empty.end();
@@ -99,7 +79,7 @@ TEST(RankDeficient, DependentChannelsGiveTheMinimumNormSolution)
     }
     Eigen::MatrixXd want = minimumNorm(p);
     for (auto solver : {hybridSolve, generalSolve}) {
-        std::vector<float> H = solve(solver, p);
+        std::vector<float> H = run(solver, p);
         EXPECT_LT(relativeError(coefficients(H, 5), want), 1e-4);
         expectNormalEquations(p, H);
     }
@@ -110,13 +90,13 @@ TEST(RankDeficient, FewerSamplesThanChannelsStaysInsideTheQRSolver)
     Problem p = randomProblem(3, 5, 60u);
     Eigen::MatrixXd want = minimumNorm(p);
     for (auto solver : {hybridSolve, generalSolve})
-        EXPECT_LT(relativeError(coefficients(solve(solver, p), 5), want), 1e-4);
+        EXPECT_LT(relativeError(coefficients(run(solver, p), 5), want), 1e-4);
     // No samples: nothing is known and the minimum-norm answer is zero.
     Problem empty = randomProblem(0, 4, 61u);
     for (auto solver : {hybridSolve, generalSolve})
-        EXPECT_EQ(coefficients(solve(solver, empty), 4), Eigen::MatrixXd::Zero(4, 3));
+        EXPECT_EQ(coefficients(run(solver, empty), 4), Eigen::MatrixXd::Zero(4, 3));
     // The regularised fit of no samples is zero as well.
-    EXPECT_EQ(coefficients(solve(hybridSolveWithRegularization, empty, 1.0f), 4), Eigen::MatrixXd::Zero(4, 3));
+    EXPECT_EQ(coefficients(run(hybridSolveWithRegularization, empty, 1.0f), 4), Eigen::MatrixXd::Zero(4, 3));
 }
 
 TEST(PivotedQR, EqualNormsPivotOnTheLowestPosition)
@@ -124,18 +104,18 @@ TEST(PivotedQR, EqualNormsPivotOnTheLowestPosition)
     // Columns (3, 4, 0) and (0, 3, 4) both have norm 5. Pivoting on column 0
     // first leaves its entries below row 0 as they are; pivoting on column 1
     // would reflect column 0 and fill in its last row.
-    auto run = [](float scale1) {
+    auto factor = [](float scale1) {
         std::vector<float> A = {3, 4, 0, 0, 3 * scale1, 4 * scale1};
         std::vector<float> B(9, 1.0f);
         std::vector<float> X(8);
         pivotedQRLeastSquares(3, 2, A.data(), B.data(), X.data());
         return A;
     };
-    std::vector<float> tie = run(1.0f);
+    std::vector<float> tie = factor(1.0f);
     EXPECT_EQ(tie[1], 4.0f);
     EXPECT_EQ(tie[2], 0.0f);
     // A strictly larger second column is taken first, and column 0 changes.
-    std::vector<float> larger = run(1.001f);
+    std::vector<float> larger = factor(1.001f);
     EXPECT_NE(larger[2], 0.0f);
 }
 
@@ -159,20 +139,20 @@ TEST(FailedSolve, SingularAugmentedSystemIsNaN)
         p.R[size_t(i) * 4 + i] = 1.0f;
     p.T.assign(12, 1.0f);
     p.w.assign(4, 256.0f);
-    EXPECT_TRUE(allNaN(solve(hybridSolveWithRegularization, p, -256.0f)));
-    EXPECT_TRUE(allNaN(solve(generalSolveWithRegularization, p, -256.0f)));
+    EXPECT_TRUE(allNaN(run(hybridSolveWithRegularization, p, -256.0f)));
+    EXPECT_TRUE(allNaN(run(generalSolveWithRegularization, p, -256.0f)));
     // The same data with light weights goes through Cholesky, which breaks down.
     p.w.assign(4, 1.0f);
-    EXPECT_TRUE(allNaN(solve(hybridSolveWithRegularization, p, -1.0f)));
+    EXPECT_TRUE(allNaN(run(hybridSolveWithRegularization, p, -1.0f)));
 }
 
 TEST(FailedSolve, CholeskyWithoutFallbackReportsABreakdown)
 {
     Problem p = randomProblem(100, 4, 70u);
     zeroChannel(p, 1);
-    EXPECT_TRUE(allNaN(solve(specialSolve, p)));
+    EXPECT_TRUE(allNaN(run(specialSolve, p)));
     // A ridge makes the same problem solvable again.
-    std::vector<float> H = solve(specialSolveWithRegularization, p, 1.0f);
+    std::vector<float> H = run(specialSolveWithRegularization, p, 1.0f);
     EXPECT_TRUE(std::all_of(H.begin(), H.end(), [](float v) { return std::isfinite(v); }));
     EXPECT_LT(relativeError(coefficients(H, 4), closedForm(p, 1.0)), 2e-5);
 }

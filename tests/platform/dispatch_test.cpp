@@ -4,6 +4,7 @@
 
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <condition_variable>
@@ -20,28 +21,8 @@ namespace {
 
 using namespace std::chrono_literals;
 
-// A flag that blocks can wait on; waits give up after a while so a fault
-// fails the test instead of hanging it.
-class Gate {
-public:
-    void open()
-    {
-        std::lock_guard lock(mutex_);
-        open_ = true;
-        cv_.notify_all();
-    }
-    bool wait()
-    {
-        std::unique_lock lock(mutex_);
-        return cv_.wait_for(lock, 10s, [&] { return open_; });
-    }
-
-private:
-    std::mutex mutex_;
-    std::condition_variable cv_;
-    bool open_ = false;
-};
-
+// Counts events; waits give up after a while so that a fault fails the test
+// instead of hanging it.
 class Counter {
 public:
     void add()
@@ -54,11 +35,6 @@ public:
     {
         std::unique_lock lock(mutex_);
         return cv_.wait_for(lock, 10s, [&] { return count_ >= n; });
-    }
-    int count()
-    {
-        std::lock_guard lock(mutex_);
-        return count_;
     }
 
 private:
@@ -87,6 +63,30 @@ private:
 
 dispatch_queue_t queue(long priority) { return dispatch_get_global_queue(priority, 0); }
 
+// Keeps all workers but one busy, so that the queue order becomes the run
+// order of that one worker.
+class OneFreeWorker {
+public:
+    OneFreeWorker()
+    {
+        int held = int(VPDispatchWorkerCount()) - 1;
+        for (int i = 0; i < held; ++i)
+            dispatch_async(queue(DISPATCH_QUEUE_PRIORITY_HIGH), [this] {
+                started_.add();
+                released_.waitFor(1);
+            });
+        EXPECT_TRUE(started_.waitFor(held));
+    }
+    ~OneFreeWorker()
+    {
+        released_.add();
+        VPDispatchDrain();
+    }
+
+private:
+    Counter started_, released_;
+};
+
 class DispatchTest : public ::testing::Test {
 protected:
     void TearDown() override
@@ -102,53 +102,34 @@ TEST_F(DispatchTest, GlobalQueuesExistForTheFourPrioritiesOnly)
     std::vector<dispatch_queue_t> queues = {queue(DISPATCH_QUEUE_PRIORITY_HIGH), queue(DISPATCH_QUEUE_PRIORITY_DEFAULT),
                                             queue(DISPATCH_QUEUE_PRIORITY_LOW),
                                             queue(DISPATCH_QUEUE_PRIORITY_BACKGROUND)};
-    for (size_t i = 0; i < queues.size(); ++i) {
-        ASSERT_NE(queues[i], nullptr);
-        for (size_t j = 0; j < i; ++j)
-            EXPECT_NE(queues[i], queues[j]);
-    }
+    std::sort(queues.begin(), queues.end());
+    EXPECT_NE(queues[0], nullptr);
+    EXPECT_EQ(std::unique(queues.begin(), queues.end()), queues.end());
     EXPECT_EQ(queue(1), nullptr);
-    EXPECT_EQ(queue(DISPATCH_QUEUE_PRIORITY_HIGH), queues[0]);
 }
 
-// With every worker held but one, that one worker takes the queued blocks
-// highest priority first and in submission order within a priority.
 TEST_F(DispatchTest, HigherPriorityFirstFifoWithin)
 {
-    const size_t workers = VPDispatchWorkerCount();
-    std::vector<std::unique_ptr<Gate>> gates;
-    Counter started;
-    for (size_t i = 0; i < workers; ++i) {
-        gates.push_back(std::make_unique<Gate>());
-        Gate* gate = gates.back().get();
-        dispatch_async(queue(DISPATCH_QUEUE_PRIORITY_DEFAULT), [&started, gate] {
-            started.add();
-            gate->wait();
-        });
-    }
-    ASSERT_TRUE(started.waitFor(int(workers)));
-
     Trace trace;
     Counter done;
-    auto step = [&](long priority, const char* name) {
-        dispatch_async(queue(priority), [&trace, &done, name] {
-            trace.add(name);
-            done.add();
-        });
-    };
-    step(DISPATCH_QUEUE_PRIORITY_LOW, "low1");
-    step(DISPATCH_QUEUE_PRIORITY_BACKGROUND, "background");
-    step(DISPATCH_QUEUE_PRIORITY_DEFAULT, "default1");
-    step(DISPATCH_QUEUE_PRIORITY_HIGH, "high1");
-    step(DISPATCH_QUEUE_PRIORITY_DEFAULT, "default2");
-    step(DISPATCH_QUEUE_PRIORITY_HIGH, "high2");
-    step(DISPATCH_QUEUE_PRIORITY_LOW, "low2");
-
-    gates[0]->open();
-    ASSERT_TRUE(done.waitFor(7));
-    for (auto& gate : gates)
-        gate->open();
-    VPDispatchDrain();
+    {
+        OneFreeWorker one;
+        Counter release;
+        dispatch_async(queue(DISPATCH_QUEUE_PRIORITY_HIGH), [&] { release.waitFor(1); }); // the free one
+        for (auto [priority, name] : {std::pair{DISPATCH_QUEUE_PRIORITY_LOW, "low1"},
+                                      {DISPATCH_QUEUE_PRIORITY_BACKGROUND, "background"},
+                                      {DISPATCH_QUEUE_PRIORITY_DEFAULT, "default1"},
+                                      {DISPATCH_QUEUE_PRIORITY_HIGH, "high1"},
+                                      {DISPATCH_QUEUE_PRIORITY_DEFAULT, "default2"},
+                                      {DISPATCH_QUEUE_PRIORITY_HIGH, "high2"},
+                                      {DISPATCH_QUEUE_PRIORITY_LOW, "low2"}})
+            dispatch_async(queue(priority), [&trace, &done, name] {
+                trace.add(name);
+                done.add();
+            });
+        release.add();
+        ASSERT_TRUE(done.waitFor(7));
+    }
     EXPECT_EQ(trace.steps(),
               (std::vector<std::string>{"high1", "high2", "default1", "default2", "low1", "low2", "background"}));
 }
@@ -243,32 +224,20 @@ TEST_F(DispatchTest, ManualModeHoldsWorkUntilFiredThenRunsItByDueTime)
     VPDispatchDrain();
     EXPECT_EQ(VPDispatchPendingDelayed(), 4u);
 
-    // One worker at a time, so that the queue order is the run order.
-    const size_t workers = VPDispatchWorkerCount();
-    std::vector<std::unique_ptr<Gate>> gates;
-    Counter started;
-    for (size_t i = 0; i + 1 < workers; ++i) {
-        gates.push_back(std::make_unique<Gate>());
-        Gate* gate = gates.back().get();
-        dispatch_async(queue(DISPATCH_QUEUE_PRIORITY_HIGH), [&started, gate] {
-            started.add();
-            gate->wait();
-        });
+    {
+        OneFreeWorker one;
+        EXPECT_EQ(VPDispatchFireDelayed(), 4u);
+        EXPECT_EQ(VPDispatchPendingDelayed(), 0u);
     }
-    ASSERT_TRUE(started.waitFor(int(workers) - 1));
-    EXPECT_EQ(VPDispatchFireDelayed(), 4u);
-    EXPECT_EQ(VPDispatchPendingDelayed(), 0u);
-    Counter done;
-    dispatch_async(queue(DISPATCH_QUEUE_PRIORITY_BACKGROUND), [&] { done.add(); });
-    ASSERT_TRUE(done.waitFor(1));
-    for (auto& gate : gates)
-        gate->open();
-    VPDispatchDrain();
     EXPECT_EQ(trace.steps(), (std::vector<std::string>{"zero", "now", "one", "five"}));
 }
 
+// Work not yet due does not hold up Drain; due work runs without being fired.
 TEST_F(DispatchTest, RealModeRunsWorkWhenDue)
 {
+    std::atomic<bool> late{false};
+    dispatch_after(dispatch_time(DISPATCH_TIME_NOW, int64_t(3600 * NSEC_PER_SEC)), queue(DISPATCH_QUEUE_PRIORITY_LOW),
+                   [&] { late = true; });
     Counter done;
     std::atomic<uint64_t> ranAt{0};
     uint64_t start = mach_absolute_time();
@@ -279,20 +248,12 @@ TEST_F(DispatchTest, RealModeRunsWorkWhenDue)
                    });
     ASSERT_TRUE(done.waitFor(1));
     EXPECT_GE(ranAt.load() - start, 3 * NSEC_PER_MSEC);
-    EXPECT_EQ(VPDispatchPendingDelayed(), 0u);
-}
-
-TEST_F(DispatchTest, DrainIgnoresWorkNotYetDue)
-{
-    std::atomic<bool> ran{false};
-    dispatch_after(dispatch_time(DISPATCH_TIME_NOW, int64_t(3600 * NSEC_PER_SEC)), queue(DISPATCH_QUEUE_PRIORITY_LOW),
-                   [&] { ran = true; });
     VPDispatchDrain();
-    EXPECT_FALSE(ran.load());
+    EXPECT_FALSE(late.load());
     EXPECT_EQ(VPDispatchPendingDelayed(), 1u);
     EXPECT_EQ(VPDispatchFireDelayed(), 1u);
     VPDispatchDrain();
-    EXPECT_TRUE(ran.load());
+    EXPECT_TRUE(late.load());
 }
 
 TEST_F(DispatchTest, TimesSaturateInsteadOfWrapping)

@@ -18,7 +18,8 @@ extern struct os_log_s _os_log_default;
 #define OS_LOG_DEFAULT (&_os_log_default)
 
 extern "C" {
-// A new handle; handles are never freed (as on the host platform).
+// The handle of a subsystem and category, made on first use and never freed
+// (as on the host platform); asking again gives the same handle.
 os_log_t os_log_create(const char* subsystem, const char* category);
 bool os_log_type_enabled(os_log_t log, os_log_type_t type);
 void _os_log_emit(os_log_t log, os_log_type_t type, const char* format, ...);

@@ -1,0 +1,92 @@
+// A `vantish` device description of any content: parseDeviceDescription, then
+// the unit it describes made real (registry entries, the service and its
+// driver properties, boot arguments, device-information answers), and the
+// plug-in matched and opened on it as the event system does, its queued
+// calibration run, and one sample filtered.
+//
+// Input: the JSON text. Values may read files only by plain names in the
+// workspace folder, which holds "blob.bin".
+#include "support/FuzzSupport.h"
+#include "support/PlainFiles.h"
+
+#include "host/DeviceDescription.h"
+#include "host/DriverSample.h"
+#include "host/Unit.h"
+
+#include <VantishPlatform/DeviceState.h>
+#include <VantishPlatform/HIDHost.h>
+
+#include <memory>
+#include <optional>
+
+namespace {
+
+const std::filesystem::path& descriptionFile()
+{
+    static const std::filesystem::path file = [] {
+        const auto& root = fz::Workspace::get().root;
+        const uint8_t blob[] = {1, 0, 0, 0, 0x10, 0x20, 0x30, 0x40};
+        fz::writeFile(root / "blob.bin", blob);
+        return root / "device.json";
+    }();
+    return file;
+}
+
+std::optional<host::DeviceDescription> parse(const uint8_t* data, size_t size)
+{
+    const nlohmann::json json = nlohmann::json::parse(data, data + size, nullptr, false);
+    if (json.is_discarded() || !fz::readsOnlyPlainFiles(json))
+        return std::nullopt;
+    try {
+        return host::parseDeviceDescription(json, descriptionFile());
+    } catch (const std::exception&) {
+        return std::nullopt; // the command reports it and stops
+    }
+}
+
+void runPlugIn(IOHIDServiceRef service)
+{
+    fz::PlugIn plugin;
+    VantishPlugIn::match(&*plugin, service, 0);
+    VantishPlugIn::open(&*plugin, service, 0);
+    fz::runQueuedWork();
+
+    ALSSampleRecord record;
+    record.lux = 120.0f;
+    record.sampleChannelCount = 4;
+    record.channelValues = {100.0f, 180.0f, 60.0f, 350.0f, 40.0f, 5.0f};
+    IOHIDEventRef event = host::createALSEvent(record, 1000);
+    VantishPlugIn::filter(&*plugin, event);
+    CFRelease(event);
+}
+
+// Puts back what a unit changes process-wide.
+void resetDevice()
+{
+    const fz::Workspace& workspace = fz::Workspace::get();
+    VPRegistryReset();
+    VPQVTSetStoreDirectory(workspace.store.string());
+    VPSetBootArgs(std::string());
+    VPTessaryReset();
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
+{
+    fz::Workspace::get().clear();
+    const auto description = parse(data, size);
+    if (!description)
+        return 0;
+    std::unique_ptr<host::Unit> unit;
+    try {
+        unit = std::make_unique<host::Unit>(*description);
+    } catch (const std::exception&) {
+        resetDevice();
+        return 0;
+    }
+    runPlugIn(unit->service());
+    unit.reset();
+    resetDevice();
+    return 0;
+}

@@ -1,0 +1,113 @@
+// The driver's sample record inside an ALS event, of any length and content,
+// through filter (overrides, spike tests, the colour fit against a published
+// per-chip database, the write-back) and logALSSample, then the copy-event
+// path on a second event carrying the same record.
+//
+// Input:
+//   byte 0   flags: bit 0 RGBC override on, bit 1 chromaticity override on,
+//            bit 2 channel-ratio mitigation on, bit 3 lambda configured, bit 4
+//            the database is normalised (per-channel deviations), bit 5 the
+//            event has no record child, bit 6 the event is not an ALS event,
+//            bit 7 dbReady is off
+//   byte 1   numberOfChannels      byte 2  database channels (0..7)
+//   byte 3   sensorType            byte 4  chipType        byte 5  mitigationType
+//   6 x u32  RGBC override values  3 x f64 chromaticity override x, y, Y
+//   f32      lambda                u64     event time stamp
+//   rest     the record
+#include "support/FuzzSupport.h"
+
+#include "calibration/CFOwned.h"
+
+#include <IOKit/hid/IOHIDEvent.h>
+
+#include <memory>
+
+namespace {
+
+constexpr uint32_t kSources = 8;
+
+enum Flags : uint8_t {
+    kRGBCOverride = 1 << 0,
+    kChromaticityOverride = 1 << 1,
+    kMitigation = 1 << 2,
+    kLambda = 1 << 3,
+    kNormalised = 1 << 4,
+    kNoRecord = 1 << 5,
+    kNotALS = 1 << 6,
+    kNotReady = 1 << 7,
+};
+
+// A small database whose sources differ in their channel balance.
+SpectralDatabasePtr makeDatabase(uint32_t channels, bool normalised)
+{
+    auto db = std::make_shared<SpectralDatabase>();
+    db->allocate(kSources, channels);
+    for (uint32_t i = 0; i < kSources; ++i) {
+        for (uint32_t j = 0; j < channels; ++j)
+            db->dbChannelResponses[j * kSources + i] = float(1 + (i * 7 + j * 3) % 11);
+        db->dbXYZ[i] = 0.3f + 0.05f * float(i);
+        db->dbXYZ[kSources + i] = 0.35f;
+        db->dbXYZ[2 * kSources + i] = 0.4f - 0.03f * float(i);
+    }
+    if (normalised)
+        db->channelStdDev.assign(channels, 1.5f);
+    db->dbInfo.sources = int32_t(kSources);
+    return db;
+}
+
+IOHIDEventRef createEvent(bool als, bool withRecord, std::span<const uint8_t> record, uint64_t timeStamp)
+{
+    IOHIDEventRef event = IOHIDEventCreate(
+        kCFAllocatorDefault, als ? kIOHIDEventTypeAmbientLightSensor : kIOHIDEventTypeVendorDefined, timeStamp, 0);
+    if (withRecord) {
+        IOHIDEventRef child = IOHIDEventCreateVendorDefinedEvent(kCFAllocatorDefault, timeStamp, 0xFF00, 4, 0,
+                                                                 record.data(), CFIndex(record.size()), 0);
+        if (child) {
+            IOHIDEventAppendEvent(event, child, 0);
+            CFRelease(child);
+        }
+    }
+    return event;
+}
+
+} // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
+{
+    fz::Workspace::get();
+    fz::Input input(data, size);
+    const uint8_t flags = input.take<uint8_t>();
+    const uint8_t channels = input.take<uint8_t>();
+    const uint8_t dbChannels = input.take<uint8_t>() % 8;
+    const uint8_t sensorType = input.take<uint8_t>();
+    const uint8_t chipType = input.take<uint8_t>();
+    const uint8_t mitigationType = input.take<uint8_t>();
+
+    fz::PlugIn plugin;
+    plugin->numberOfChannels = channels;
+    plugin->dbChannelCount = dbChannels;
+    plugin->sensorType = sensorType;
+    plugin->chipType = chipType;
+    plugin->mitigationType = mitigationType;
+    plugin->channelRatioMitigation = (flags & kMitigation) != 0;
+    plugin->rgbcOverrideActive = (flags & kRGBCOverride) != 0;
+    for (auto& value : plugin->rgbcOverride)
+        value = input.take<uint32_t>();
+    plugin->chromaticityOverrideActive = (flags & kChromaticityOverride) != 0;
+    plugin->overrideX = input.take<double>();
+    plugin->overrideY = input.take<double>();
+    plugin->overrideLuminance = input.take<double>();
+    plugin->lambdaConfigured = (flags & kLambda) != 0;
+    plugin->lambda = input.take<float>();
+    const uint64_t timeStamp = input.take<uint64_t>();
+    plugin->publishDatabase(makeDatabase(dbChannels, flags & kNormalised), !(flags & kNotReady));
+
+    const bool als = !(flags & kNotALS);
+    const bool withRecord = !(flags & kNoRecord);
+    CFOwned<IOHIDEventRef> event(createEvent(als, withRecord, input.rest(), timeStamp));
+    plugin->filter(event.get(), false);
+    CFOwned<IOHIDEventRef> copy(createEvent(als, withRecord, input.rest(), timeStamp));
+    plugin->filterCopyEvent(copy.get());
+    plugin->logALSSample(copy.get(), true);
+    return 0;
+}

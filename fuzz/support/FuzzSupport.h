@@ -1,0 +1,104 @@
+// What every fuzz target shares: a private workspace on a memory file system
+// (device paths mapped into it, a small reference database, an empty state
+// folder and factory store), quiet logging, one plug-in instance per input,
+// and a reader that takes option bytes from the front of an input.
+//
+// Every input starts from the same state: no cache file, no store record, no
+// queued work left over from the input before.
+#pragma once
+
+#include "plugin/VantishPlugIn.h"
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <filesystem>
+#include <span>
+#include <string>
+
+namespace fz {
+
+// Sources in the workspace's reference databases: enough for a real fit,
+// few enough to build a per-chip database in well under a millisecond.
+constexpr int kReferenceSources = 6;
+// The chip ID the generated factory records carry and the plug-in expects.
+constexpr uint32_t kChipId = 0x1A2B3C4D;
+
+class Workspace {
+public:
+    // The process's workspace, made on first use and removed at exit. Logging
+    // is switched to debug level (every message is formatted) without echo
+    // (VANTISH_FUZZ_LOG=1 in the environment keeps the echo),
+    // and delayed work waits until fired (so factory retries never run on
+    // their own).
+    static const Workspace& get();
+
+    std::filesystem::path root;   // everything below lives here
+    std::filesystem::path system; // "/System/Library/HIDPlugins"
+    std::filesystem::path state;  // "/var/mobile"
+    std::filesystem::path store;  // the factory-data store
+
+    std::filesystem::path bundle() const { return system / "Vantish.plugin"; }
+    std::filesystem::path cacheFolder() const { return state / "Library" / "Brenzel"; }
+    std::filesystem::path referenceFile(BigDBType type) const;
+
+    // Removes every cache file (with SQLite's side files) and store record.
+    void clear() const;
+
+private:
+    Workspace();
+};
+
+// A reference database of `sources` smooth spectra of 401 samples.
+void writeReferenceDatabase(const std::filesystem::path& file, int sources);
+
+void writeFile(const std::filesystem::path& file, std::span<const uint8_t> bytes);
+
+// Takes option bytes from the front of an input; reads past the end give 0.
+class Input {
+public:
+    Input(const uint8_t* data, size_t size) : bytes_(data, size) {}
+
+    template <typename T>
+    T take()
+    {
+        T value{};
+        const size_t n = std::min(sizeof(T), bytes_.size());
+        std::memcpy(&value, bytes_.data(), n);
+        bytes_ = bytes_.subspan(n);
+        return value;
+    }
+    std::span<const uint8_t> takeBytes(size_t count)
+    {
+        const auto taken = bytes_.first(std::min(count, bytes_.size()));
+        bytes_ = bytes_.subspan(taken.size());
+        return taken;
+    }
+    std::span<const uint8_t> rest() const { return bytes_; }
+    size_t size() const { return bytes_.size(); }
+
+private:
+    std::span<const uint8_t> bytes_;
+};
+
+// A plug-in instance from the factory. On destruction, queued and delayed
+// work runs to its end first, then the host's Release.
+class PlugIn {
+public:
+    PlugIn();
+    ~PlugIn();
+    PlugIn(const PlugIn&) = delete;
+    PlugIn& operator=(const PlugIn&) = delete;
+    VantishPlugIn* operator->() const { return p_; }
+    VantishPlugIn& operator*() const { return *p_; }
+
+private:
+    VantishPlugIn* p_;
+};
+
+// Runs all queued and delayed work until none is left.
+void runQueuedWork();
+
+CFDataRef createData(std::span<const uint8_t> bytes);
+
+} // namespace fz

@@ -1,0 +1,106 @@
+// vantish lightdb info FILE: what a reference light-source database or a
+// per-chip cache holds, read without changing it.
+#include "host/vantish/Commands.h"
+
+#include "lightdb/Inspect.h"
+
+#include <sqlite3.h>
+
+#include <cstdio>
+#include <iostream>
+#include <memory>
+
+namespace vantish {
+
+namespace {
+
+struct LightdbOptions {
+    std::string file;
+};
+
+// "S0 … S400" for a run of sample columns, else the names as they are.
+std::string columnRange(const std::vector<std::string>& columns)
+{
+    if (columns.empty())
+        return "none";
+    if (columns.size() <= 6) {
+        std::string names;
+        for (const auto& c : columns)
+            names += (names.empty() ? "" : ", ") + c;
+        return names;
+    }
+    return columns.front() + " … " + columns.back();
+}
+
+void printInfo(const LDBMFileSummary& s)
+{
+    if (!s.hasInfo) {
+        std::printf("Info      no Info table\n");
+        return;
+    }
+    std::printf("Info      version %.6g, sources %d", double(s.info.version), int(s.info.sources));
+    if (s.kind == LDBMFileSummary::Kind::Cache)
+        std::printf(", smallversion %.6g, algo %d, chip ID 0x%08X", double(s.info.smallVersion), int(s.info.algo),
+                    unsigned(s.info.chipID));
+    std::printf("\n");
+}
+
+int runInfo(const LightdbOptions& o)
+{
+    LDBMFileSummary s;
+    if (const int rc = LDBMInspect(o.file, s); rc != SQLITE_OK) {
+        std::cerr << "vantish lightdb info: " << o.file << ": cannot read (" << sqlite3_errstr(rc) << ")\n";
+        return 2;
+    }
+    std::printf("File      %s\n", o.file.c_str());
+    switch (s.kind) {
+    case LDBMFileSummary::Kind::Reference:
+        std::printf("Kind      reference light-source database\n");
+        printInfo(s);
+        std::printf("Sources   %lld (rows of Spectra)\n", static_cast<long long>(s.rows));
+        std::printf("Grid      %zu sample columns, %s", s.columns.size(), columnRange(s.columns).c_str());
+        if (s.columns.size() == 401)
+            std::printf(" (300–1100 nm in 2 nm steps)");
+        std::printf("\n");
+        if (!s.hasNames) {
+            std::printf("Families  not recorded (no Names table)\n");
+            break;
+        }
+        std::printf("Families ");
+        for (const auto& f : s.namePrefixes)
+            std::printf(" %s", f.c_str());
+        std::printf("\n");
+        break;
+    case LDBMFileSummary::Kind::Cache:
+        std::printf("Kind      per-chip database cache\n");
+        printInfo(s);
+        std::printf("Sources   %lld (rows of RR)\n", static_cast<long long>(s.rows));
+        std::printf("Channels  %zu: %s\n", s.columns.size(), columnRange(s.columns).c_str());
+        break;
+    case LDBMFileSummary::Kind::Unknown:
+        std::cerr << "vantish lightdb info: " << o.file
+                  << ": neither a reference database (no Spectra table) nor a per-chip cache (no RR table)\n";
+        return 1;
+    }
+    if (s.hasInfo && s.info.sources != s.rows)
+        std::printf("Warning   Info counts %d sources, the table holds %lld rows\n", int(s.info.sources),
+                    static_cast<long long>(s.rows));
+    return 0;
+}
+
+} // namespace
+
+Runner addLightdbCommand(CLI::App& app, const CommonOptions&)
+{
+    auto o = std::make_shared<LightdbOptions>();
+    app.require_subcommand(1);
+    CLI::App* info = app.add_subcommand("info", "Show a light database file: Info, source count, grid, families");
+    info->add_option("file", o->file, "A reference database (bzlight.sqlite, bzlight-02.sqlite) or a per-chip cache "
+                                      "(bzrgbc_<orientation>.sqlite)")
+        ->required();
+    info->footer("Families are the name prefixes of the sources (led, ledr, daylight, …) from the file's Names\n"
+                 "table; the reference databases built by make_reference_db carry one.");
+    return [o] { return runInfo(*o); };
+}
+
+} // namespace vantish

@@ -1,0 +1,30 @@
+#include "host/vantish/ReadingFilter.h"
+
+#include "host/DriverSample.h"
+#include "host/EventInput.h"
+
+#include <sstream>
+#include <stdexcept>
+
+namespace vantish {
+
+ClientColour filterReading(OpenedUnit& opened, const host::SensorReading& reading)
+{
+    std::stringstream csv;
+    host::writeReadingsCsvHeader(csv, reading.channels.size());
+    host::writeReadingCsv(csv, reading);
+    host::EventReader reader(csv, host::InputFormat::Csv, opened.channelCount());
+    std::vector<host::InputError> errors;
+    const std::optional<host::InputRow> row = reader.next(errors);
+    if (!row || !errors.empty())
+        throw std::logic_error("a synthetic reading did not read back: " +
+                               (errors.empty() ? std::string("no row") : errors.front().describe("reading")));
+
+    IOHIDEventRef event = host::createALSEvent(row->record, uint64_t(row->timeSeconds * 1e9));
+    opened.session->filter(event);
+    ClientColour colour = readClientColour(event, row->record);
+    CFRelease(event);
+    return colour;
+}
+
+} // namespace vantish

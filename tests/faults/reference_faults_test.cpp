@@ -1,0 +1,92 @@
+// A shipped reference database that is missing or cut short: nothing is
+// built, the database in use (and colour) stays as it was, the cache file is
+// not touched, and the fault is logged once.
+#include "faults/FaultFixture.h"
+
+using faults::Source;
+using unit::kSecondReference;
+
+namespace {
+
+class ReferenceFaults : public faults::FaultTest {
+protected:
+    // A factory-calibrated unit with colour on and its cache written.
+    void SetUp() override
+    {
+        FaultTest::SetUp();
+        open(Source::Factory);
+        ASSERT_TRUE(colourFrom(kSecondReference));
+        database_ = plugin_->snapshotDatabase().db;
+        cache_ = cacheBytes();
+        ASSERT_FALSE(cache_.empty());
+    }
+
+    void expectNothingChanged()
+    {
+        EXPECT_EQ(plugin_->snapshotDatabase().db, database_) << "the database in use was replaced";
+        EXPECT_TRUE(colourFrom(kSecondReference));
+        EXPECT_TRUE(cacheBytes() == cache_) << "the cache file changed";
+    }
+
+    void truncateReference(const unit::Reference& r, double fraction)
+    {
+        const auto file = reference(r);
+        std::filesystem::resize_file(file, uintmax_t(double(std::filesystem::file_size(file)) * fraction));
+    }
+
+    SpectralDatabasePtr database_;
+    std::vector<uint8_t> cache_;
+};
+
+} // namespace
+
+TEST_F(ReferenceFaults, MissingReference)
+{
+    std::filesystem::remove(reference(kSecondReference));
+    rebuild(Source::Factory);
+    EXPECT_EQ(logged("Database not found!\n"), 1u);
+    EXPECT_EQ(logged("Failed to rebuild databases."), 1u);
+    expectNothingChanged();
+}
+
+TEST_F(ReferenceFaults, ReferenceFileCutShort)
+{
+    truncateReference(kSecondReference, 0.5);
+    rebuild(Source::Factory);
+    EXPECT_EQ(logged("Database not found!\n"), 1u);
+    EXPECT_EQ(logged("Failed to rebuild databases."), 1u);
+    expectNothingChanged();
+}
+
+// The file reads, but holds fewer light sources than its Info promises.
+TEST_F(ReferenceFaults, ReferenceWithRowsMissing)
+{
+    for (const auto* r : {&kSecondReference, &unit::kDefaultReference}) {
+        sqlite3* db = nullptr;
+        ASSERT_EQ(sqlite3_open(reference(*r).c_str(), &db), SQLITE_OK);
+        unit::execSql(db, "DELETE FROM Spectra WHERE ID >= " + std::to_string(unit::kSources / 2));
+        sqlite3_close(db);
+    }
+    rebuild(Source::Factory);
+    EXPECT_EQ(logged("Failed to parse big DB -1\n"), 1u);
+    EXPECT_EQ(logged("Failed to rebuild databases."), 1u);
+    expectNothingChanged();
+
+    rebuild(Source::Configuration);
+    EXPECT_EQ(logged("Failed to parse big DB -1\n"), 2u);
+    EXPECT_EQ(logged("Failed to rebuild databases."), 2u);
+    expectNothingChanged();
+}
+
+// At bring-up there is no database to keep: the driver has its factory
+// record, colour stays off, and nothing is written.
+TEST_F(ReferenceFaults, MissingReferenceAtBringUp)
+{
+    std::filesystem::remove(reference(kSecondReference));
+    std::filesystem::remove(cacheFile());
+    open(Source::Factory);
+    EXPECT_EQ(logged("Database not found!\n"), 1u);
+    EXPECT_EQ(logged("QVT Calibration has been loaded successfully"), 2u) << "the record reached the driver";
+    EXPECT_FALSE(colour());
+    EXPECT_FALSE(std::filesystem::exists(cacheFile()));
+}
