@@ -4,8 +4,8 @@
 // plug-in matched and opened on it as the event system does, its queued
 // calibration run, and one sample filtered.
 //
-// Input: the JSON text. Values may read files only by plain names in the
-// workspace folder, which holds "blob.bin".
+// Input: the JSON text. Values may read files only inside the description's
+// folder, which holds the files of data/devices/*/ and "blob.bin".
 #include "support/FuzzSupport.h"
 #include "support/PlainFiles.h"
 
@@ -21,13 +21,22 @@
 
 namespace {
 
-const std::filesystem::path& descriptionFile()
+namespace fs = std::filesystem;
+
+// The description is read as if it lay in a folder holding the files of the
+// sample devices of data/ (registry blobs, store records) and "blob.bin", so
+// that their descriptions find what they name.
+const fs::path& descriptionFile()
 {
-    static const std::filesystem::path file = [] {
-        const auto& root = fz::Workspace::get().root;
+    static const fs::path file = [] {
+        const fs::path unit = fz::Workspace::get().root / "unit";
+        fs::create_directories(unit);
+        std::error_code ec;
+        for (const auto& device : fs::directory_iterator(fs::path(VANTISH_SOURCE_DIR) / "data" / "devices", ec))
+            fs::copy(device.path(), unit, fs::copy_options::recursive | fs::copy_options::overwrite_existing, ec);
         const uint8_t blob[] = {1, 0, 0, 0, 0x10, 0x20, 0x30, 0x40};
-        fz::writeFile(root / "blob.bin", blob);
-        return root / "device.json";
+        fz::writeFile(unit / "blob.bin", blob);
+        return unit / "device.json";
     }();
     return file;
 }

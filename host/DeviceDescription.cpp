@@ -59,7 +59,12 @@ CFTypeRef createPropertyValue(const nlohmann::json& value, const fs::path& folde
 {
     switch (value.type()) {
     case nlohmann::json::value_t::string:
-        return CFStringCreateWithCString(nullptr, value.get<std::string>().c_str(), kCFStringEncodingUTF8);
+        // Text that did not come through the JSON parser (a bare word after
+        // "KEY=") may not be UTF-8, and then no CF string can hold it.
+        if (CFStringRef string = CFStringCreateWithCString(nullptr, value.get<std::string>().c_str(),
+                                                           kCFStringEncodingUTF8))
+            return string;
+        throw DescriptionError(where + ": the text is not UTF-8");
     case nlohmann::json::value_t::boolean:
         return CFRetain(value.get<bool>() ? kCFBooleanTrue : kCFBooleanFalse);
     case nlohmann::json::value_t::number_integer:

@@ -56,7 +56,8 @@ struct DeviceDescription {
 DeviceDescription loadDeviceDescription(const std::filesystem::path& file);
 DeviceDescription parseDeviceDescription(const nlohmann::json& json, const std::filesystem::path& file);
 
-// A new CF value (caller releases) for a property value; `where` names it in errors.
+// A new CF value (caller releases, never null) for a property value; throws
+// DescriptionError, with `where` naming the value, for one that has no CF form.
 CFTypeRef createPropertyValue(const nlohmann::json& value, const std::filesystem::path& folder,
                               const std::string& where);
 

@@ -15,7 +15,8 @@ ProgressBar::ProgressBar(std::string label, size_t total, bool enabled)
 {
 }
 
-ProgressBar::ProgressBar(std::string label, size_t total) : ProgressBar(std::move(label), total, isatty(STDERR_FILENO) != 0)
+ProgressBar::ProgressBar(std::string label, size_t total)
+    : ProgressBar(std::move(label), total, isatty(STDERR_FILENO) != 0)
 {
 }
 

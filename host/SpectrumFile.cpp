@@ -129,7 +129,8 @@ spectra::Source loadSpectrumFile(const fs::path& file)
         fail(file, "cannot be read");
 
     std::string extension = file.extension().string();
-    std::transform(extension.begin(), extension.end(), extension.begin(), [](unsigned char c) { return std::tolower(c); });
+    std::transform(extension.begin(), extension.end(), extension.begin(),
+                   [](unsigned char c) { return std::tolower(c); });
     const Table table = extension == ".csv" ? readCsv(file) : readCgats(file);
 
     for (double v : table.values)

@@ -4,11 +4,13 @@
 
 #include <CoreFoundation/CoreFoundation.h>
 
+#include <algorithm>
 #include <cmath>
 #include <cstdlib>
 #include <fstream>
 #include <iterator>
 #include <optional>
+#include <variant>
 
 namespace fs = std::filesystem;
 
@@ -90,8 +92,8 @@ spectra::Spectrum sampleMajorChannel(const std::vector<double>& samples, size_t 
     return s;
 }
 
-Json decodeRecord(const DeviceDescription& unit, const std::vector<uint8_t>& bytes, std::optional<calibcodec::Kind> kind,
-                  const std::string& what)
+Json decodeRecord(const DeviceDescription& unit, const std::vector<uint8_t>& bytes,
+                  std::optional<calibcodec::Kind> kind, const std::string& what)
 {
     auto decoded = calibcodec::decode(bytes, kind);
     if (!decoded)
@@ -137,7 +139,9 @@ UnitSpectra fromXwCl(const DeviceDescription& unit, const Json& fields, const st
     const unsigned numberOfChannels = unsigned(number(at(fields, {"entries", entry, "nChannels"})));
     if (numberOfChannels < 4 || numberOfChannels > kMaxReportedChannels)
         fail(unit, what + ": " + std::to_string(numberOfChannels) + " channels");
-    auto stored = [&](size_t c) { return spectrumOf(numbers(at(fields, {"entries", entry, "channels", c, "spectrum"}))); };
+    auto stored = [&](size_t c) {
+        return spectrumOf(numbers(at(fields, {"entries", entry, "channels", c, "spectrum"})));
+    };
     auto weight = [&](size_t c) { return number(at(fields, {"entries", entry, "channels", c, "luxCoeff"})); };
 
     UnitSpectra out;

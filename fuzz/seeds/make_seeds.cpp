@@ -4,12 +4,16 @@
 // from inputs that reach deep into the code. The records are written field by
 // field at the layouts' offsets with plausible values.
 //
-// Usage: fuzz_make_seeds OUTPUT_FOLDER   (one sub-folder per target)
+// Usage: fuzz_make_seeds OUTPUT_FOLDER [DATA_FOLDER]   (one sub-folder per target)
+// With the project's data/ folder, the sample devices seed the targets too:
+// their descriptions, store records and registry blobs, framed as each
+// target reads them.
 #include "calibration/VD6287Layout.h"
 #include "calibration/XwCAT2Layout.h"
 #include "calibration/XwClLayout.h"
 #include "support/FuzzSupport.h"
 
+#include <nlohmann/json.hpp>
 #include <sqlite3.h>
 
 #include <cstdio>
@@ -490,15 +494,69 @@ void hostInputSeeds()
   "bootArgs": "quiet", "deviceInfo": {"ProductName": "Dravik OS", "DeviceColor": "2", "productType": 47}})"));
 }
 
+// ---- Sample devices of data/ ------------------------------------------------------------
+
+uint8_t layoutOfSize(size_t size)
+{
+    namespace v = stored::vd6287;
+    namespace x = stored::xwcl;
+    if (size == stored::xwca::kSize)
+        return 0;
+    if (size == x::kOneEntrySize || size == x::kTwoEntrySize)
+        return 1;
+    return size == v::kV1Size ? 2 : size == v::kV3Size ? 3 : 9;
+}
+
+uint8_t storeClass(const std::string& name) { return name == "XwCl" ? 1 : name == "XwCM" ? 2 : 0; }
+
+int serviceInt(const nlohmann::json& device, const char* key, int fallback)
+{
+    const auto& properties = device.value("service", nlohmann::json::object()).value("properties", nlohmann::json::object());
+    return properties.contains(key) && properties[key].is_number_integer() ? properties[key].get<int>() : fallback;
+}
+
+void deviceSeeds(const fs::path& data)
+{
+    std::error_code ec;
+    for (const auto& entry : fs::directory_iterator(data / "devices", ec)) {
+        const fs::path folder = entry.path();
+        const std::string name = folder.filename().string();
+        const Bytes description = readFile(folder / "device.json");
+        if (description.empty())
+            continue;
+        seed("device_description", name, description);
+        const nlohmann::json device = nlohmann::json::parse(description.begin(), description.end(), nullptr, false);
+        const uint8_t channels = uint8_t(serviceInt(device, "NumberOfChannels", 5));
+        const uint8_t sensor = uint8_t(serviceInt(device, "ALSSensorType", 0));
+
+        for (const auto& record : fs::directory_iterator(folder / "store", ec)) {
+            if (record.path().has_extension())
+                continue; // the decoded .json beside each record
+            const Bytes bytes = readFile(record.path());
+            const uint8_t cls = storeClass(record.path().filename().string());
+            seed("factory_layouts", name, framed({layoutOfSize(bytes.size()), 0}, bytes));
+            // "XwCM" is read on Dravik OS only.
+            seed("factory_store", name, framed({uint8_t(cls == 2 ? cls | 4 : cls), 0, channels, sensor}, bytes));
+        }
+        const Bytes calibration = readFile(folder / "registry" / "alsCalibration.bin");
+        if (!calibration.empty()) {
+            const Bytes aux = readFile(folder / "registry" / "alsAuxCalibration.bin");
+            seed("sysconfig_blobs", name, sysconfigInput(uint8_t(aux.empty() ? 0x06 : 0x0E), channels, calibration, aux));
+        }
+    }
+}
+
 } // namespace
 
 int main(int argc, char** argv)
 {
-    if (argc != 2) {
-        std::fprintf(stderr, "usage: %s OUTPUT_FOLDER\n", argv[0]);
+    if (argc != 2 && argc != 3) {
+        std::fprintf(stderr, "usage: %s OUTPUT_FOLDER [DATA_FOLDER]\n", argv[0]);
         return 2;
     }
     gOut = argv[1];
+    if (argc == 3)
+        deviceSeeds(argv[2]);
     factorySeeds();
     sysconfigSeeds();
     sampleSeeds();

@@ -91,7 +91,7 @@ void Workspace::clear() const
         fs::remove_all(entry.path(), ec);
 }
 
-void writeReferenceDatabase(const fs::path& file, int sources)
+void writeReferenceDatabase(const fs::path& file, int sources, int samples)
 {
     std::error_code ec;
     fs::remove(file, ec);
@@ -103,9 +103,10 @@ void writeReferenceDatabase(const fs::path& file, int sources)
         throw std::runtime_error("cannot create " + file.string());
     }
     exec(db, "CREATE TABLE Info (version REAL, sources INTEGER, columns INTEGER, samples INTEGER)");
-    exec(db, "INSERT INTO Info VALUES (1.5, " + std::to_string(sources) + ", 405, 401)");
+    exec(db, "INSERT INTO Info VALUES (1.5, " + std::to_string(sources) + ", " + std::to_string(samples + 4) + ", " +
+                 std::to_string(samples) + ")");
     std::string columns = "ID INTEGER PRIMARY KEY, X REAL, Y REAL, Z REAL";
-    for (int s = 0; s < 401; ++s)
+    for (int s = 0; s < samples; ++s)
         columns += ", S" + std::to_string(s) + " REAL";
     exec(db, "CREATE TABLE Spectra (" + columns + ")");
     exec(db, "BEGIN");
@@ -113,7 +114,7 @@ void writeReferenceDatabase(const fs::path& file, int sources)
         std::string row = std::to_string(i) + ", " + std::to_string(0.3 + 0.1 * i) + ", " +
                           std::to_string(0.35 + 0.05 * (i % 3)) + ", " + std::to_string(0.4 - 0.05 * i);
         // Smooth spectra whose slope differs from source to source.
-        for (int s = 0; s < 401; ++s)
+        for (int s = 0; s < samples; ++s)
             row += ", " + std::to_string(1.0 + 0.01 * s * (i % 3) + 0.005 * (400 - s) * ((i + 1) % 2));
         exec(db, "INSERT INTO Spectra VALUES (" + row + ")");
     }

@@ -49,8 +49,9 @@ private:
     Workspace();
 };
 
-// A reference database of `sources` smooth spectra of 401 samples.
-void writeReferenceDatabase(const std::filesystem::path& file, int sources);
+// A reference database of `sources` smooth spectra of `samples` samples (the
+// calibration spectra have 401; fewer are allowed).
+void writeReferenceDatabase(const std::filesystem::path& file, int sources, int samples = 401);
 
 void writeFile(const std::filesystem::path& file, std::span<const uint8_t> bytes);
 

@@ -179,7 +179,9 @@ Runner addEvalCommand(CLI::App& app, const CommonOptions& common)
                    "Lights to evaluate: spectrum files (CGATS .sp or nm,value .csv) or folders of them;\n"
                    "default: the built-in test lights");
     app.add_option("--report", options->report, "Also write the evaluation as one HTML file");
-    app.add_option("--lux", options->lux, "Illuminance of every reading")->check(CLI::PositiveNumber)->capture_default_str();
+    app.add_option("--lux", options->lux, "Illuminance of every reading")
+        ->check(CLI::PositiveNumber)
+        ->capture_default_str();
     app.footer("For each light: the true chromaticity and CCT (CIE 1931 2°), the plug-in's estimate through its\n"
                "filter, and the estimate of one global least-squares channel-to-XYZ matrix fitted over the unit's\n"
                "reference sources, both from the same noise-free reading; errors as Δu′v′ and ΔCCT; summary:\n"

@@ -43,8 +43,8 @@ void describeLight(const spectra::Source& light, const host::UnitSpectra& unit, 
     const spectra::Xy xy = spectra::chromaticity(spectra::tristimulus(light.spectrum));
     const spectra::Uv uv = spectra::uvPrime(xy);
     const auto cct = spectra::correlatedColourTemperature(xy);
-    std::printf("# vantish synth: %s at %g lux, relative noise %g, seed %llu, %u sample(s)\n", light.name.c_str(), o.lux,
-                o.noise, static_cast<unsigned long long>(o.seed), o.count);
+    std::printf("# vantish synth: %s at %g lux, relative noise %g, seed %llu, %u sample(s)\n", light.name.c_str(),
+                o.lux, o.noise, static_cast<unsigned long long>(o.seed), o.count);
     std::printf("# channel spectra: %s\n", unit.origin.c_str());
     std::printf("# true chromaticity x=%.4f y=%.4f u'=%.4f v'=%.4f CCT=%s\n", xy.x, xy.y, uv.u, uv.v,
                 cct ? (std::to_string(long(*cct + 0.5)) + " K").c_str() : "none");

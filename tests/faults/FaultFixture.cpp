@@ -7,9 +7,7 @@
 #include <VantishPlatform/HIDHost.h>
 #include <VantishPlatform/Paths.h>
 
-#include <cstdlib>
 #include <mutex>
-#include <unistd.h>
 
 namespace faults {
 namespace {
@@ -77,11 +75,7 @@ StatementHook::StatementHook(std::string sqlPrefix, std::function<void()> action
 {
 }
 
-FaultTest::MemoryTemporaryFolder::MemoryTemporaryFolder()
-{
-    if (!std::getenv("TMPDIR") && std::filesystem::is_directory("/dev/shm") && access("/dev/shm", W_OK) == 0)
-        setenv("TMPDIR", "/dev/shm", 0);
-}
+FaultTest::MemoryTemporaryFolder::MemoryTemporaryFolder() { unit::preferMemoryTemporaryFolder(); }
 
 void FaultTest::SetUp()
 {

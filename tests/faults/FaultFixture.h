@@ -41,7 +41,10 @@ protected:
 
     std::filesystem::path cacheFolder() const { return state_.path() / "Library" / "Brenzel"; }
     std::filesystem::path cacheFile() const { return cacheFolder() / "bzrgbc_1.sqlite"; }
-    std::filesystem::path reference(const unit::Reference& r) const { return system_.path() / "Vantish.plugin" / r.file; }
+    std::filesystem::path reference(const unit::Reference& r) const
+    {
+        return system_.path() / "Vantish.plugin" / r.file;
+    }
     std::filesystem::path storeRecord() const { return store_.path() / "XwCl"; }
     std::vector<uint8_t> cacheBytes() const { return unit::readFile(cacheFile()); }
     // Whether the cache file holds a whole cache built from `r`.
@@ -57,8 +60,7 @@ protected:
     size_t logged(const std::string& message) { return log_.count(message); }
     size_t loggedStartingWith(const std::string& start);
 
-    // Cache writes commit statement by statement; on a memory file system the
-    // tests do not wait for the disk's flushes. Made before the folders.
+    // Made before the folders, so that they are made on a memory file system.
     struct MemoryTemporaryFolder {
         MemoryTemporaryFolder();
     } memoryTemporaryFolder_;

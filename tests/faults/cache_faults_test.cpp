@@ -95,7 +95,8 @@ TEST_F(CacheFaults, FullDiskPartWayKeepsTheLastCache)
     const auto good = cacheBytes();
     ASSERT_FALSE(good.empty());
     {
-        faults::WriterHook full([](sqlite3* db) { sqlite3_exec(db, "PRAGMA max_page_count=3", nullptr, nullptr, nullptr); });
+        faults::WriterHook full(
+            [](sqlite3* db) { sqlite3_exec(db, "PRAGMA max_page_count=3", nullptr, nullptr, nullptr); });
         rebuild(Source::Factory);
         EXPECT_EQ(logged("Failed to create small DB 13\n"), 1u);
         EXPECT_TRUE(colourFrom(kSecondReference)) << "the new database, as after any factory build";

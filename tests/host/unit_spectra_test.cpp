@@ -1,8 +1,17 @@
 // A unit's channel spectra as its calibration stores them: found where the
 // plug-in looks, decoded by the codec, in the channel order the driver reports.
+#include "host/Bundle.h"
+#include "host/DriverSample.h"
+#include "host/PlugInSession.h"
+#include "host/SyntheticReading.h"
+#include "host/Unit.h"
 #include "host/UnitSpectra.h"
+#include "host/calib/CalibCodec.h"
+#include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
 #include "support/TestSupport.h"
+
+#include <VantishPlatform/DispatchControl.h>
 
 #include <gtest/gtest.h>
 
@@ -16,7 +25,10 @@ namespace fs = std::filesystem;
 
 fs::path devices() { return fs::path(vt::sourceDir()) / "data" / "devices"; }
 
-host::DeviceDescription unit(const std::string& name) { return host::loadDeviceDescription(devices() / name / "device.json"); }
+host::DeviceDescription unit(const std::string& name)
+{
+    return host::loadDeviceDescription(devices() / name / "device.json");
+}
 
 struct Expected {
     const char* unit;
@@ -55,10 +67,10 @@ TEST(UnitSpectra, SampleUnitsGiveTheirSensorsChannelsInOrder)
         for (const auto& channel : s.channels)
             storedPeak = std::max(storedPeak, *std::max_element(channel.begin(), channel.end()));
         const double factor = storedPeak / sensor.peak();
-        double worst = 0;
+        double worst = 0; // relative to the stored peak
         for (size_t c = 0; c < s.channelCount(); ++c)
             for (size_t i = 0; i < size_t(spectra::kSamples); ++i)
-                worst = std::max(worst, std::abs(s.channels[c][i] - factor * sensor.channels[c][i]) / (factor * sensor.peak()));
+                worst = std::max(worst, std::abs(s.channels[c][i] - factor * sensor.channels[c][i]) / storedPeak);
         EXPECT_LT(worst, 2e-3) << "stored spectra are not the model sensor's channels in order";
         EXPECT_GT(*std::max_element(s.luxCoefficients.begin(), s.luxCoefficients.end()), 0.0);
     }
@@ -80,6 +92,96 @@ TEST(UnitSpectra, AuxiliaryBlobScalesOnlyTheInfraredTail)
             tailDiffers |= std::abs(compensated.channels[c][size_t(i)] - plain.channels[c][size_t(i)]) > 1.0;
     }
     EXPECT_TRUE(tailDiffers);
+}
+
+// The chromaticities the plug-in on `description` gives for readings (x = y
+// = 0 where it gives no colour).
+std::vector<spectra::Xy> plugInChromaticities(const host::DeviceDescription& description,
+                                              const std::vector<host::SensorReading>& readings)
+{
+    vt::DeviceRoots roots;
+    const host::Bundle bundle(vt::bundleDir());
+    host::Unit unit(description);
+    host::PlugInSession session(bundle, unit);
+    EXPECT_EQ(session.match(), 1000);
+    session.open();
+    VPDispatchDrain();
+
+    std::vector<spectra::Xy> out;
+    for (const host::SensorReading& reading : readings) {
+        ALSSampleRecord record;
+        record.sampleChannelCount = uint8_t(reading.channels.size());
+        record.sampleOrientation = 1;
+        record.lux = float(reading.lux);
+        for (size_t c = 0; c < reading.channels.size(); ++c)
+            record.channelValues[c] = float(reading.channels[c]);
+        IOHIDEventRef event = host::createALSEvent(record, 1000);
+        session.filter(event);
+        const spectra::Xyz xyz{IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent0),
+                               IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent1),
+                               IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent2)};
+        out.push_back(spectra::chromaticity(xyz));
+        CFRelease(event);
+    }
+    return out;
+}
+
+// XwCl chip types 1 and 2 fold stored channel 0 into the last column (twice
+// the last stored channel, or that plus stored channel 0) and the driver
+// reports the columns: a reference source read through those spectra comes
+// back from the real plug-in at its own chromaticity.
+TEST(UnitSpectra, XwClChipTypesMapTheColumnsAsThePlugInFoldsThem)
+{
+    for (const char* name : {"xwcl-62", "xwcl-14"}) {
+        const host::DeviceDescription original = unit(name);
+        const std::string storeClass = std::string(name) == "xwcl-62" ? "XwCA" : "XwCl";
+        std::ifstream in(*original.factoryStore / (storeClass + ".json"));
+        calibcodec::Json record = calibcodec::Json::parse(in);
+        const host::UnitSpectra plain = host::loadUnitSpectra(original);
+        const size_t n = plain.channelCount();
+        const size_t skip = n == 6 ? 1 : 0; // the 6-channel record keeps channel 0 out of the fit
+
+        for (int chipType : {1, 2}) {
+            SCOPED_TRACE(std::string(name) + " chip type " + std::to_string(chipType));
+            record["fields"]["header"]["chipType"] = chipType;
+            const auto bytes = calibcodec::encode(record);
+            ASSERT_TRUE(bytes) << bytes.error;
+            vt::TempDir store;
+            std::ofstream(store.path() / storeClass, std::ios::binary)
+                .write(reinterpret_cast<const char*>(bytes.value->data()), std::streamsize(bytes.value->size()));
+            host::DeviceDescription changed = original;
+            changed.factoryStore = store.path();
+
+            const host::UnitSpectra mapped = host::loadUnitSpectra(changed);
+            ASSERT_EQ(mapped.channelCount(), n);
+            // Stored channel k of the record at one sample (chip type 0 maps nothing,
+            // so plain's channel k is stored channel k).
+            const size_t probe = size_t(spectra::sampleAtOrBelow(550));
+            auto stored = [&](size_t k) {
+                return record["fields"]["entries"][0]["channels"][k]["spectrum"][probe].get<double>();
+            };
+            for (size_t c = 0; c < skip; ++c)
+                EXPECT_EQ(mapped.channels[c][probe], stored(c));
+            for (size_t c = skip; c + 1 < n; ++c)
+                EXPECT_EQ(mapped.channels[c][probe], stored(c + 1 - skip)) << c;
+            EXPECT_EQ(mapped.channels[n - 1][probe], chipType == 1 ? 2 * stored(5) : stored(5) + stored(0));
+            EXPECT_EQ(plain.channels[n - 1][probe], stored(n - 1));
+
+            // Broadband reference sources: the fit of this sensor blurs line spectra
+            // with the clear channel folded in, whatever the mapping.
+            const std::vector<const spectra::Source*> lights = {spectra::findSource("daylight-5000K"),
+                                                                spectra::findSource("planck-2856K")};
+            std::vector<host::SensorReading> readings;
+            for (const spectra::Source* light : lights)
+                readings.push_back(host::synthesiseReading(mapped, light->spectrum, 300));
+            const std::vector<spectra::Xy> estimates = plugInChromaticities(changed, readings);
+            for (size_t i = 0; i < lights.size(); ++i) {
+                const spectra::Xy truth = spectra::chromaticity(spectra::tristimulus(lights[i]->spectrum));
+                EXPECT_LT(spectra::deltaUvPrime(spectra::uvPrime(estimates[i]), spectra::uvPrime(truth)), 0.001)
+                    << lights[i]->name;
+            }
+        }
+    }
 }
 
 TEST(UnitSpectra, UnitsWithoutStoredSpectraSayWhy)

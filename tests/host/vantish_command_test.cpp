@@ -141,7 +141,8 @@ TEST_F(VantishCommand, SynthIntoRunReturnsTheLightWithinTheEvaluatedAccuracy)
     const Outcome eval = run("eval " + device("xwcl-14"));
     ASSERT_EQ(eval.status, 0) << eval.err;
     std::smatch m;
-    ASSERT_TRUE(std::regex_search(eval.out, m, std::regex(light + " +[0-9.]+ +[0-9.]+ +[0-9]+ +[0-9.]+ +[0-9.]+ +([0-9.]+)")))
+    ASSERT_TRUE(
+        std::regex_search(eval.out, m, std::regex(light + " +[0-9.]+ +[0-9.]+ +[0-9]+ +[0-9.]+ +[0-9.]+ +([0-9.]+)")))
         << eval.out;
     const double evaluated = std::stod(m[1]);
     ASSERT_TRUE(std::regex_search(eval.out, m, std::regex("\n  plug-in +[0-9.]+ +[0-9.]+ +([0-9.]+)")));

@@ -118,12 +118,12 @@ Host::Host(unsigned index, const Plan& plan, StoreSwitch& store)
 void Host::run()
 {
     for (unsigned n = 0; n < plan_.lifetimesPerHost; ++n) {
-        lifetime(n, plan_.eventsPerLifetime);
-        lifetime(n + 1, plan_.briefEvents);
+        lifetime(n, plan_.eventsPerLifetime, plan_.rebuildsPerLifetime);
+        lifetime(n + 1, plan_.briefEvents, 0);
     }
 }
 
-void Host::lifetime(unsigned number, unsigned events)
+void Host::lifetime(unsigned number, unsigned events, unsigned rebuilds)
 {
     const Kind kind = Kind((number + index_) % 3);
     IOHIDServiceRef service = VPServiceCreate(registryID(index_));
@@ -146,10 +146,8 @@ void Host::lifetime(unsigned number, unsigned events)
 
     // The first rebuild comes right after open, against bring-up on its queue.
     auto rebuildDue = [&](unsigned e) {
-        if (events == plan_.briefEvents)
-            return false;
-        for (unsigned r = 0; r < plan_.rebuildsPerLifetime; ++r)
-            if (e == (r == 0 ? 1 : r * events / plan_.rebuildsPerLifetime))
+        for (unsigned r = 0; r < rebuilds; ++r)
+            if (e == (r == 0 ? 1 : r * events / rebuilds))
                 return true;
         return false;
     };
@@ -207,8 +205,8 @@ void Host::changeProperty(unsigned step)
         setProperty("RGBCOverride", intNumber(0));
         break;
     case 4:
-        setProperty("ChromaticityOverride",
-                    numberArray({doubleNumber(kOverride.x), doubleNumber(kOverride.y), doubleNumber(kOverrideLuminance)}));
+        setProperty("ChromaticityOverride", numberArray({doubleNumber(kOverride.x), doubleNumber(kOverride.y),
+                                                         doubleNumber(kOverrideLuminance)}));
         overrideOn_ = true;
         break;
     case 5:

@@ -70,7 +70,7 @@ private:
     enum class Kind { Configuration, Factory, FactoryStoreLate };
     enum class Expect { DatabaseOrNone, Override, OverrideOrNone };
 
-    void lifetime(unsigned number, unsigned events);
+    void lifetime(unsigned number, unsigned events, unsigned rebuilds);
     void setProperty(const char* key, CFTypeRef value);
     void changeProperty(unsigned step);
     void rebuild(IOHIDServiceRef service, bool configuration);

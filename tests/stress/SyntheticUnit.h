@@ -22,11 +22,13 @@
 #include <array>
 #include <cmath>
 #include <cstdint>
+#include <cstdlib>
 #include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <optional>
 #include <string>
+#include <unistd.h>
 #include <vector>
 
 namespace unit {
@@ -37,7 +39,10 @@ constexpr int kSources = 24;
 constexpr float kLux = 200.0f;
 
 inline double wavelength(unsigned sample) { return 300.0 + 2.0 * sample; }
-inline double bump(double nm, double centre, double width) { return std::exp(-0.5 * std::pow((nm - centre) / width, 2)); }
+inline double bump(double nm, double centre, double width)
+{
+    return std::exp(-0.5 * std::pow((nm - centre) / width, 2));
+}
 
 // ---- The two reference databases ---------------------------------------------------
 
@@ -172,6 +177,15 @@ inline sctest::Bytes calibrationBlob(uint8_t orientation)
     entry.orientation = orientation;
     entry.spectrum = [](unsigned s, unsigned c) { return channelSensitivity(s, c); };
     return sctest::blob({entry.bytes()});
+}
+
+// Cache writes commit statement by statement; with temporary folders on a
+// memory file system the tests do not wait for the disk's flushes. Takes
+// effect for folders made afterwards, and only when TMPDIR is not set.
+inline void preferMemoryTemporaryFolder()
+{
+    if (!std::getenv("TMPDIR") && std::filesystem::is_directory("/dev/shm") && access("/dev/shm", W_OK) == 0)
+        setenv("TMPDIR", "/dev/shm", 0);
 }
 
 inline void writeFile(const std::filesystem::path& file, const std::vector<uint8_t>& bytes)

@@ -8,7 +8,7 @@
 //
 // VANTISH_STRESS_SCALE sizes the run: 1 is the full run (about 100 000
 // filtered events, 72 rebuilds, 48 instance lifetimes); the default, 0.04,
-// keeps the ordinary test run to a few seconds.
+// keeps the ordinary test run to about a second.
 #include "stress/Host.h"
 #include "support/TestSupport.h"
 
@@ -26,7 +26,6 @@
 #include <filesystem>
 #include <memory>
 #include <thread>
-#include <unistd.h>
 
 namespace {
 
@@ -37,14 +36,6 @@ double scaleFromEnvironment()
     const char* text = std::getenv("VANTISH_STRESS_SCALE");
     const double scale = text ? std::strtod(text, nullptr) : kDefaultScale;
     return scale > 0.0 ? scale : kDefaultScale;
-}
-
-// Cache writes commit statement by statement; on a memory file system the
-// run measures the plug-in, not the disk's flushes.
-void preferMemoryTemporaryFolder()
-{
-    if (!std::getenv("TMPDIR") && std::filesystem::is_directory("/dev/shm") && access("/dev/shm", W_OK) == 0)
-        setenv("TMPDIR", "/dev/shm", 0);
 }
 
 CFDataRef orientationData(uint32_t orientation)
@@ -116,7 +107,7 @@ class ConcurrencyStress : public ::testing::Test {
 protected:
     void SetUp() override
     {
-        preferMemoryTemporaryFolder();
+        unit::preferMemoryTemporaryFolder();
         system_ = std::make_unique<vt::TempDir>();
         state_ = std::make_unique<vt::TempDir>();
         storeFolder_ = std::make_unique<vt::TempDir>();
@@ -193,12 +184,13 @@ TEST_F(ConcurrencyStress, EveryColourComesFromOneWholeDatabase)
     const size_t cacheWrites = log.count("Small DB has been created\n");
     const size_t skippedWrites = log.count("A newer database has been published; this one's cache is not written.\n");
     const size_t failedRebuilds = log.count("Failed to rebuild databases.");
-    std::printf("stress (scale %g): %u filtered events and %u copies (colours: %u bzlight, %u bzlight-02, %u overridden, "
-                "%u none; largest deviation %.2g), %u rebuilds (%zu failed for an empty store), %u lifetimes (%u released with work queued), "
-                "%zu store retries, %zu cache writes, %zu queued writes skipped for a newer database, %.1f s\n",
+    std::printf("stress (scale %g): %u filtered events and %u copies (colours: %u bzlight, %u bzlight-02, "
+                "%u overridden, %u none; largest deviation %.2g), %u rebuilds (%zu failed for an empty store), "
+                "%u lifetimes (%u released with work queued), %zu store retries, %zu cache writes, "
+                "%zu queued writes skipped for a newer database, %.1f s\n",
                 scale, all.events, all.copies, all.fromDefault, all.fromSecond, all.overridden, all.withoutColour,
-                all.largestDeviation, all.rebuilds, failedRebuilds, all.lifetimes, all.releasedWithWorkQueued, retries, cacheWrites,
-                skippedWrites, seconds);
+                all.largestDeviation, all.rebuilds, failedRebuilds, all.lifetimes, all.releasedWithWorkQueued, retries,
+                cacheWrites, skippedWrites, seconds);
     RecordProperty("events", int(all.events));
     RecordProperty("rebuilds", int(all.rebuilds));
     RecordProperty("lifetimes", int(all.lifetimes));
