@@ -78,10 +78,15 @@ CFTypeRef createPropertyValue(const nlohmann::json& value, const fs::path& folde
     }
     case nlohmann::json::value_t::array: {
         CFMutableArrayRef array = CFArrayCreateMutable(nullptr, CFIndex(value.size()), &kCFTypeArrayCallBacks);
-        for (size_t i = 0; i < value.size(); ++i) {
-            CFTypeRef element = createPropertyValue(value[i], folder, where + "[" + std::to_string(i) + "]");
-            CFArrayAppendValue(array, element);
-            CFRelease(element);
+        try {
+            for (size_t i = 0; i < value.size(); ++i) {
+                CFTypeRef element = createPropertyValue(value[i], folder, where + "[" + std::to_string(i) + "]");
+                CFArrayAppendValue(array, element);
+                CFRelease(element);
+            }
+        } catch (...) {
+            CFRelease(array); // an element that has no CF form ends the whole value
+            throw;
         }
         return array;
     }

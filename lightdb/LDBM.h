@@ -32,10 +32,14 @@ int LDBMParseBigDB(const LDBMInfo* info, LDBMSpectrumConsumer consumer, void* us
 // or the source's weighted response total is 0 or not finite.
 int ProgressCallback(void* matrices, int id, float* xyz, float* spectrum, int sampleCount);
 
+// The most light sources a reference file may give: far more than any
+// shipped file holds, and a per-chip database of a few megabytes at most.
+constexpr int32_t LDBMMaxSources = 65536;
+
 // Reads the reference Info into `info`, then checks the cache for `orientation`;
 // when it is valid, sets *cacheValid and overwrites `info` with the cache's Info.
 // 0, the reference's open or statement code, or SQLITE_CORRUPT when the
-// reference gives a negative source count.
+// reference gives a negative source count or more than LDBMMaxSources.
 int LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType type, float expectedSmallVersion);
 
 // Loads the cache's RR and XX tables into `responses` (responseRows x N) and

@@ -229,8 +229,9 @@ int LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType 
         if (rc != SQLITE_OK)
             return rc;
     }
-    // A negative source count cannot size a database.
-    if (reference.sources < 0)
+    // A negative source count cannot size a database, and a huge one would
+    // have the event system's process allocate gigabytes for a broken file.
+    if (reference.sources < 0 || reference.sources > LDBMMaxSources)
         return SQLITE_CORRUPT;
     *info = reference;
 

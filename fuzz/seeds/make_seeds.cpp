@@ -520,7 +520,7 @@ void deviceSeeds(const fs::path& data)
     std::error_code ec;
     for (const auto& entry : fs::directory_iterator(data / "devices", ec)) {
         const fs::path folder = entry.path();
-        const std::string name = folder.filename().string();
+        const std::string name = "data-" + folder.filename().string();
         const Bytes description = readFile(folder / "device.json");
         if (description.empty())
             continue;

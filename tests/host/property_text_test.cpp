@@ -1,6 +1,7 @@
-// Client-property keys and values of `vantish run` input that are not UTF-8
-// text (a bare word after "!set KEY=" is taken as it stands). No CF string can
-// hold them; found by fuzzing, the command used to abort on the null value.
+// Property values that have no CF form, found by fuzzing: text that is not
+// UTF-8 (a bare word after "!set KEY=" in `vantish run` input is taken as it
+// stands; the command used to abort on the null value), and arrays holding
+// such an element (the array was leaked).
 #include "host/DeviceDescription.h"
 #include "support/TestSupport.h"
 
@@ -39,6 +40,15 @@ TEST(PropertyText, TextThatIsNotUTF8HasNoPropertyValue)
     ASSERT_NE(text, nullptr);
     EXPECT_EQ(CFGetTypeID(text), CFStringGetTypeID());
     CFRelease(text);
+}
+
+TEST(PropertyText, AnArrayWithAnElementThatHasNoCFFormIsRefusedWhole)
+{
+    // Under the address sanitizer a leaked array fails the test program.
+    EXPECT_THROW(host::createPropertyValue(nlohmann::json::parse("[1, [2, null]]"), ".", "value"),
+                 host::DescriptionError);
+    EXPECT_THROW(host::createPropertyValue(nlohmann::json::parse("[{\"data\": \"0g\"}]"), ".", "value"),
+                 host::DescriptionError);
 }
 
 TEST(PropertyText, RunReportsTheLinesAndGoesOn)
