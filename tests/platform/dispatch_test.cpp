@@ -228,6 +228,10 @@ TEST_F(DispatchTest, ManualModeHoldsWorkUntilFiredThenRunsItByDueTime)
         OneFreeWorker one;
         EXPECT_EQ(VPDispatchFireDelayed(), 4u);
         EXPECT_EQ(VPDispatchPendingDelayed(), 0u);
+        // Let the one free worker run all four before the others are let go,
+        // or a freed worker may take "five" while "one" is still running.
+        for (int i = 0; i < 5000 && trace.steps().size() < 4; ++i)
+            std::this_thread::sleep_for(std::chrono::milliseconds(1));
     }
     EXPECT_EQ(trace.steps(), (std::vector<std::string>{"zero", "now", "one", "five"}));
 }
