@@ -183,6 +183,8 @@ DeviceDescription parseDeviceDescription(const nlohmann::json& json, const fs::p
         for (const auto& [key, value] : d.registry[i].properties.items())
             CFRelease(createPropertyValue(value, d.folder(),
                                           file.string() + ": registry[" + std::to_string(i) + "].properties." + key));
+    for (const auto& [key, value] : d.answers.items())
+        CFRelease(createPropertyValue(value, d.folder(), file.string() + ": deviceInfo." + key));
     return d;
 }
 

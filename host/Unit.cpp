@@ -20,8 +20,8 @@ void setProperties(const nlohmann::json& properties, const fs::path& folder, con
                    const std::function<void(CFStringRef, CFTypeRef)>& set)
 {
     for (const auto& [key, value] : properties.items()) {
+        CFTypeRef cfValue = createPropertyValue(value, folder, where + "." + key); // may throw
         CFStringRef cfKey = CFStringCreateWithCString(nullptr, key.c_str(), kCFStringEncodingUTF8);
-        CFTypeRef cfValue = createPropertyValue(value, folder, where + "." + key);
         set(cfKey, cfValue);
         CFRelease(cfValue);
         CFRelease(cfKey);

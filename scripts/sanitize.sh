@@ -1,20 +1,21 @@
 #!/usr/bin/env bash
 # The test suite under sanitizers:
 #   address  every test, built with AddressSanitizer and UndefinedBehaviorSanitizer (build-asan/)
-#   thread   the concurrency tests, built with ThreadSanitizer (build-tsan/)
+#   thread   the tests of the code that runs on several threads, with the stress and fault
+#            tests, built with ThreadSanitizer (build-tsan/)
 # Usage: scripts/sanitize.sh [address] [thread]   (both when none is named)
 # Any sanitizer report fails the test that triggered it, and so the script.
 set -euo pipefail
 here=$(cd "$(dirname "$0")/.." && pwd)
 jobs=$(nproc)
 
-# Tests that exercise threads: the work queues, publication of the per-chip
-# database, reference counting of the instance and of CF values, queued
-# calibration work (retries, asynchronous cache writes, rebuilds), plus every
-# test labelled "stress". Death tests fork, which ThreadSanitizer does not
-# support in a process that has started threads.
-tsan_tests='Dispatch|Publication|ReferenceCount|CFLifetime|QVTStore|BringUp|CachedDB|ClientProperties|Calibration\.|Database\.'
-tsan_targets=(Vantish test_platform test_plugin test_lightdb test_calibration test_sysconfig)
+# The ThreadSanitizer run: every test of the programs whose code runs on more
+# than one thread (the work queues, publication of the per-chip database,
+# reference counting of the instance and of CF values, calibration queued at
+# open, store retries, cache writes and client rebuilds), with the stress and
+# fault tests. Death tests are left out: they fork, which ThreadSanitizer does
+# not support in a process that has started threads.
+tsan_folders=(platform plugin lightdb calibration sysconfig stress faults)
 
 # Reports carry whole stacks and stop the process at the first finding.
 export ASAN_OPTIONS=${ASAN_OPTIONS:-detect_leaks=1:abort_on_error=1:strict_string_checks=1}
@@ -24,6 +25,9 @@ export TSAN_OPTIONS=${TSAN_OPTIONS:-halt_on_error=1:second_deadlock_stack=1}
 # then reports their internal handshakes. Our code calls it from one thread at
 # a time per computation, so one BLAS thread loses nothing.
 export OPENBLAS_NUM_THREADS=1
+# The stress test at full size (about 100 000 filtered events, 70 rebuilds,
+# 48 instance lifetimes); the ordinary test run uses a small share of it.
+export VANTISH_STRESS_SCALE=${VANTISH_STRESS_SCALE:-1}
 
 section() { printf '\n==== %s ====\n' "$*"; }
 
@@ -49,16 +53,20 @@ run_address() {
 run_thread() {
     section "ThreadSanitizer: build (build-tsan)"
     local start=$SECONDS
-    local targets=("${tsan_targets[@]}")
-    # The stress tests, once their folder is part of the build.
-    grep -q 'vantish_test_folder(stress' "$here/tests/CMakeLists.txt" && targets+=(test_stress)
+    local targets=(Vantish) labels=() folder
+    for folder in "${tsan_folders[@]}"; do
+        # A folder takes part once the test build knows it.
+        grep -q "vantish_test_folder($folder" "$here/tests/CMakeLists.txt" || continue
+        targets+=("test_$folder")
+        labels+=("$folder")
+    done
     build build-tsan thread "${targets[@]}"
     echo "built in $((SECONDS - start)) s"
-    section "ThreadSanitizer: concurrency tests"
+    section "ThreadSanitizer: tests of ${labels[*]}"
     start=$SECONDS
-    (cd "$here/build-tsan" &&
-        ctest --output-on-failure -j"$jobs" -R "$tsan_tests" -E 'DeathTest|NOT_BUILT' --no-tests=error &&
-        ctest --output-on-failure -j"$jobs" -L stress -E 'DeathTest|NOT_BUILT' --no-tests=ignore)
+    local pattern
+    pattern="^($(IFS='|'; echo "${labels[*]}"))\$"
+    (cd "$here/build-tsan" && ctest --output-on-failure -j"$jobs" -L "$pattern" -E 'DeathTest|NOT_BUILT' --no-tests=error)
     echo "tests ran in $((SECONDS - start)) s"
 }
 

@@ -1,7 +1,9 @@
 // Property values that have no CF form, found by fuzzing: text that is not
 // UTF-8 (a bare word after "!set KEY=" in `vantish run` input is taken as it
 // stands; the command used to abort on the null value), and arrays holding
-// such an element (the array was leaked).
+// such an element (the array was leaked), and device-information answers,
+// which the description check skipped (the unit's service was leaked when
+// making the unit failed on one).
 #include "host/DeviceDescription.h"
 #include "support/TestSupport.h"
 
@@ -49,6 +51,17 @@ TEST(PropertyText, AnArrayWithAnElementThatHasNoCFFormIsRefusedWhole)
                  host::DescriptionError);
     EXPECT_THROW(host::createPropertyValue(nlohmann::json::parse("[{\"data\": \"0g\"}]"), ".", "value"),
                  host::DescriptionError);
+}
+
+TEST(PropertyText, DeviceInformationAnswersAreCheckedWithTheDescription)
+{
+    const auto description = nlohmann::json::parse(R"({"deviceInfo": {"DeviceColor": "1", "ProductName": null}})");
+    try {
+        host::parseDeviceDescription(description, "unit/device.json");
+        FAIL() << "a null answer was accepted";
+    } catch (const host::DescriptionError& e) {
+        EXPECT_NE(std::string(e.what()).find("deviceInfo.ProductName"), std::string::npos) << e.what();
+    }
 }
 
 TEST(PropertyText, RunReportsTheLinesAndGoesOn)
