@@ -188,6 +188,10 @@ int buildCache(const std::string& file, const LDBMInfo& info, const float* xyz, 
         return 2;
     if (db.exec(kWriteAheadLog) != SQLITE_OK)
         return 4;
+    // The statements commit one by one; none needs to reach the disk before the
+    // last. The checkpoint below syncs the finished file before it is renamed
+    // over the cache, so a crash part-way leaves only a building file behind.
+    db.exec("PRAGMA synchronous=NORMAL");
 
     // The file is new; the drops only matter when a leftover could not be removed.
     db.exec("DROP TABLE Info");
