@@ -35,8 +35,7 @@ CFDataRef createGenericRecord(VantishPlugIn& plugin, const CalibrationEntry& ent
     const auto layout = genericEntryLayout(entry.bytes, header.revision);
     if (!layout)
         return nullptr;
-    const auto record = buildGenericRecord(entry.bytes, *layout, header.entryCount);
-    CFDataRef data = CFDataCreate(kCFAllocatorDefault, record.data(), CFIndex(record.size()));
+    CFDataRef data = sysconfig::createGenericRecord(entry.bytes, *layout, header.entryCount);
     if (!data)
         return nullptr;
     plugin.numberOfChannels = layout->nChannels;

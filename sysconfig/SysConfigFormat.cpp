@@ -94,4 +94,22 @@ std::optional<GenericEntryLayout> genericEntryLayout(std::span<const uint8_t> en
     return layout;
 }
 
+std::optional<std::span<const uint8_t>> vd6286::entryAt(CFDataRef blob, long entryOffset, uint16_t entrySize)
+{
+    if (!entryLargeEnough(entrySize)) {
+        VLOG_ERROR("Calibration data are smaller than ALSCalibrationDataVD6286 structure.");
+        return std::nullopt;
+    }
+    VLOG_INFO("ALSCalibrationDataVD6286 size: %lu, calibration data %u.", static_cast<unsigned long>(kEntrySize),
+              unsigned(entrySize));
+
+    const auto bytes = bytesOf(blob);
+    if (entryOffset < 0 || !le::fits(bytes.size(), size_t(entryOffset), kEntrySize)) {
+        VLOG_ERROR("Calibration entry at offset %ld runs past the end of the data (%ld bytes).\n", entryOffset,
+                   long(bytes.size()));
+        return std::nullopt;
+    }
+    return bytes.subspan(size_t(entryOffset), kEntrySize);
+}
+
 } // namespace sysconfig

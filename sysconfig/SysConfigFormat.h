@@ -139,6 +139,11 @@ constexpr size_t kMaxSpectrumValues = (kEntrySize - kSpectra) / 2; // 2006
 
 // The entry is long enough for the layout (its size check counts words).
 constexpr bool entryLargeEnough(uint16_t entrySize) { return entrySize / 4 > 1038; }
+
+// The entry's layout-sized bytes at `entryOffset` of `blob`, once its declared
+// size is large enough for the layout and the layout lies inside the blob;
+// nothing (with an error line) otherwise.
+std::optional<std::span<const uint8_t>> entryAt(CFDataRef blob, long entryOffset, uint16_t entrySize);
 } // namespace vd6286
 
 // ---- "alsAuxCalibration" entry ----------------------------------------------------

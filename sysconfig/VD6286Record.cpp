@@ -1,77 +1,55 @@
 // Driver record from a VD6286 registry entry (chip type 3): the 193-byte
 // five-channel layout.
+#include "calibration/DriverRecords.h"
 #include "plugin/LittleEndian.h"
 #include "plugin/Log.h"
 #include "plugin/VantishPlugIn.h"
 #include "sysconfig/FixedPoint.h"
 #include "sysconfig/SysConfigFormat.h"
 
-#include <vector>
-
 using namespace sysconfig;
 
 namespace {
 
-constexpr size_t kRecordSize = 193;
-
-// Offsets of the five-channel record.
-constexpr size_t kCalibrationSource = 1;
-constexpr size_t kCalibrationVersion = 9;
-constexpr size_t kRecordLength = 10;
-constexpr size_t kFudge = 12;
-constexpr size_t kDriverWords = 14; // iTime, aux1, aux2
-constexpr size_t kGains = 22;
-constexpr size_t kChannelCount = 26;
-constexpr size_t kGainCount = 27;
-constexpr size_t kLuxCoefficients = 28;
-constexpr size_t kCctCoefficients = 48;
-constexpr size_t kChannelBlocks = 68;
-constexpr size_t kChannelBlockSize = 25;
 constexpr unsigned kFixedGainScales = 4; // the first four gain scales are 2.0 for this chip
+constexpr uint16_t kGainScaleTwo = 0x8000; // 2.0 with 14 fraction bits
 
-constexpr uint32_t kSourceConfiguration = 1;
-
-void putChannelBlock(std::span<uint8_t> block, std::span<const uint8_t> source, unsigned nGains)
+driver::ChannelBlock channelBlock(std::span<const uint8_t> source, unsigned nGains)
 {
-    le::put<uint8_t>(block, 0, le::get<uint8_t>(source, 0));                             // dark counts
-    le::put<uint16_t>(block, 1, toQ8_8(float(le::get<uint16_t>(source, 1)) / 1000.0f)); // offset counts
-    le::put<uint16_t>(block, 5, uint16_t(le::get<uint8_t>(source, 3)));                 // channel parameter B
+    driver::ChannelBlock block;
+    block.darkCounts = le::get<uint8_t>(source, 0);
+    block.offsetCounts = int16_t(toQ8_8(float(le::get<uint16_t>(source, 1)) / 1000.0f));
+    block.channelParamB = int16_t(le::get<uint8_t>(source, 3));
     for (unsigned k = 0; k < kFixedGainScales; ++k)
-        le::put<uint16_t>(block, 7 + 2 * k, uint16_t(0x8000));
+        block.gainScale[k] = kGainScaleTwo;
     for (unsigned k = 0; k < nGains; ++k)
-        le::put<uint16_t>(block, 7 + 2 * (kFixedGainScales + k),
-                          toQ2_14(float(le::get<uint16_t>(source, 4 + 2 * k)) / 256.0f));
+        block.gainScale[kFixedGainScales + k] = toQ2_14(float(le::get<uint16_t>(source, 4 + 2 * k)) / 256.0f);
+    return block;
 }
 
-std::vector<uint8_t> buildRecord(std::span<const uint8_t> entry, uint8_t entryCount, unsigned nChannels,
-                                 unsigned nGains)
+// The five-channel record for a checked entry, or null.
+CFDataRef createRecord(std::span<const uint8_t> entry, uint8_t entryCount, unsigned nChannels, unsigned nGains)
 {
-    std::vector<uint8_t> record(kRecordSize, 0);
-    std::span<uint8_t> out(record);
+    driver::ChannelRecord record(driver::kFiveChannelRecord);
+    record.setHeader({.source = driver::CalibrationSource::Configuration,
+                      .calibrationVersion = entryCount,
+                      .fudge = toQ2_14(float(le::get<uint16_t>(entry, generic::kWordA)) / 256.0f),
+                      .iTime = le::get<uint16_t>(entry, generic::kWordB),
+                      .aux1 = le::get<uint16_t>(entry, generic::kWordB + 2),
+                      .aux2 = le::get<uint16_t>(entry, generic::kWordB + 4)});
+    for (unsigned g = 0; g < 3; ++g)
+        record.setGain(g, le::get<uint8_t>(entry, vd6286::kGain0 + g));
+    record.setCounts(uint8_t(nChannels), uint8_t(nGains));
 
-    le::put<uint8_t>(out, 0, 1);
-    le::put<uint32_t>(out, kCalibrationSource, kSourceConfiguration);
-    le::put<uint8_t>(out, kCalibrationVersion, entryCount);
-    le::put<uint16_t>(out, kRecordLength, uint16_t(kRecordSize));
-    le::put<uint16_t>(out, kFudge, toQ2_14(float(le::get<uint16_t>(entry, generic::kWordA)) / 256.0f));
-    for (size_t w = 0; w < 3; ++w)
-        le::put<uint16_t>(out, kDriverWords + 2 * w, le::get<uint16_t>(entry, generic::kWordB + 2 * w));
-    for (size_t g = 0; g < 3; ++g)
-        le::put<uint8_t>(out, kGains + g, le::get<uint8_t>(entry, vd6286::kGain0 + g));
-    le::put<uint8_t>(out, kChannelCount, uint8_t(nChannels));
-    le::put<uint8_t>(out, kGainCount, uint8_t(nGains));
-
-    for (size_t k = 0; k < vd6286::kMaxChannels; ++k) {
-        const float lux = float(le::get<int32_t>(entry, vd6286::kWeights + 4 * k)) / 1000000.0f;
-        le::put<float>(out, kLuxCoefficients + 4 * k, lux);
-        le::put<float>(out, kCctCoefficients + 4 * k, float(le::get<int32_t>(entry, vd6286::kCctCoefficients + 4 * k)));
+    for (unsigned k = 0; k < vd6286::kMaxChannels; ++k) {
+        record.setLuxCoeff(k, float(le::get<int32_t>(entry, vd6286::kWeights + 4 * k)) / 1000000.0f);
+        record.setCctCoeff(k, float(le::get<int32_t>(entry, vd6286::kCctCoefficients + 4 * k)));
     }
     for (unsigned c = 0; c < nChannels; ++c)
-        putChannelBlock(out.subspan(kChannelBlocks + kChannelBlockSize * c, kChannelBlockSize),
-                        entry.subspan(vd6286::kChannelBlocks + vd6286::kChannelBlockSize * c,
-                                      vd6286::kChannelBlockSize),
-                        nGains);
-    return record;
+        record.setChannelBlock(c, channelBlock(entry.subspan(vd6286::kChannelBlocks + vd6286::kChannelBlockSize * c,
+                                                             vd6286::kChannelBlockSize),
+                                               nGains));
+    return record.createData();
 }
 
 } // namespace
@@ -81,20 +59,10 @@ bool VantishPlugIn::processSysConfigSensorCalibrationVD6286(CFDataRef& blob, lon
                                                             ALSCalibrationSubHeader& subHeader, long& recordSize,
                                                             CFDataRef& record)
 {
-    if (!vd6286::entryLargeEnough(subHeader.entrySize)) {
-        VLOG_ERROR("Calibration data are smaller than ALSCalibrationDataVD6286 structure.");
+    const auto located = vd6286::entryAt(blob, entryOffset, subHeader.entrySize);
+    if (!located)
         return false;
-    }
-    VLOG_INFO("ALSCalibrationDataVD6286 size: %lu, calibration data %u.", static_cast<unsigned long>(vd6286::kEntrySize),
-              unsigned(subHeader.entrySize));
-
-    const auto bytes = bytesOf(blob);
-    if (entryOffset < 0 || !le::fits(bytes.size(), size_t(entryOffset), vd6286::kEntrySize)) {
-        VLOG_ERROR("Calibration entry at offset %ld runs past the end of the data (%ld bytes).\n", entryOffset,
-                   long(bytes.size()));
-        return false;
-    }
-    const auto entry = bytes.subspan(size_t(entryOffset), vd6286::kEntrySize);
+    const auto entry = *located;
     const unsigned nChannels = le::get<uint8_t>(entry, generic::kChannelCount);
     const unsigned nGains = le::get<uint8_t>(entry, generic::kGainCount);
     if (nChannels > vd6286::kMaxChannels || nGains > vd6286::kMaxGains) {
@@ -103,13 +71,12 @@ bool VantishPlugIn::processSysConfigSensorCalibrationVD6286(CFDataRef& blob, lon
         return false;
     }
 
-    const auto bytesOut = buildRecord(entry, header.entryCount, nChannels, nGains);
-    CFDataRef created = CFDataCreate(kCFAllocatorDefault, bytesOut.data(), CFIndex(bytesOut.size()));
+    CFDataRef created = createRecord(entry, header.entryCount, nChannels, nGains);
     if (!created)
         return false;
     numberOfChannels = nChannels;
     dbChannelCount = nChannels;
-    recordSize = long(kRecordSize);
+    recordSize = long(driver::kFiveChannelRecord.size);
     record = created;
     return true;
 }

@@ -11,20 +11,10 @@ bool VantishPlugIn::processSysConfigSpectrumVD6286(bool asyncCreate, CFDataRef& 
                                                    ALSCalibrationSubHeader& subHeader, Matrices& matrices,
                                                    const std::shared_ptr<SpectralDatabase>& build)
 {
-    if (!vd6286::entryLargeEnough(subHeader.entrySize)) {
-        VLOG_ERROR("Calibration data are smaller than ALSCalibrationDataVD6286 structure.");
+    const auto located = vd6286::entryAt(blob, entryOffset, subHeader.entrySize);
+    if (!located)
         return false;
-    }
-    VLOG_INFO("ALSCalibrationDataVD6286 size: %lu, calibration data %u.", static_cast<unsigned long>(vd6286::kEntrySize),
-              unsigned(subHeader.entrySize));
-
-    const auto bytes = bytesOf(blob);
-    if (entryOffset < 0 || !le::fits(bytes.size(), size_t(entryOffset), vd6286::kEntrySize)) {
-        VLOG_ERROR("Calibration entry at offset %ld runs past the end of the data (%ld bytes).\n", entryOffset,
-                   long(bytes.size()));
-        return false;
-    }
-    const auto entry = bytes.subspan(size_t(entryOffset), vd6286::kEntrySize);
+    const auto entry = *located;
     const size_t channels = size_t(matrices.nChannels);
     const unsigned nSamples = le::get<uint16_t>(entry, vd6286::kSampleCount);
     if (channels == 0 || channels > vd6286::kMaxChannels || nSamples > kMaxSpectrumSamples ||
