@@ -47,5 +47,23 @@ Percentiles interpolate linearly between the ranked errors. Units built on the s
 (\`data/devices/README.md\`) read every light alike and so share their numbers, whatever record layout carries their
 calibration. Per-light tables and the chromaticity diagram:
 \`vantish eval data/devices/<unit>/device.json --report report.html\`.
+
+## Why \`xwcl-62\` is less accurate
+
+\`xwcl-62\` carries the six-channel model sensor C6: a clear channel that only normalises the responses, and five
+narrow passbands (420, 475, 530, 590 and 650 nm) that the colour fit uses. The five-channel units carry C5, whose
+Z, Y and X channels are shaped after the colour-matching functions. C6's five channels are far from degenerate (their
+normalised sensitivities are nearly orthogonal, condition number 1.4), but no linear combination of them comes close
+to x̄, ȳ and z̄: the best one misses them by 29 %, 23 % and 59 % (relative RMS over 380–780 nm), where C5's misses
+them by 7 %, 5 % and 7 %. Broadband light hides this, because reference sources of the same kind lie close by
+(daylight, incandescent and halogen light stay below 0.001). Line spectra do not: to C6 the two test tri-phosphor
+lamps look most like white LEDs of 5000–6500 K, 0.03–0.04 away in chromaticity (1 − cos θ of 1–3 × 10⁻⁴), more than
+like the reference tri-phosphor lamps, 0.005–0.009 away (1 − cos θ of 4–9 × 10⁻⁴), so the similarity weights favour
+the wrong family; and the narrow 640 nm red LED has no reference source within 1 − cos θ of 0.009, so the fit
+extrapolates, to a negative Z. The six-channel path itself is exact: the same fit computed independently in double
+precision from the model sensor gives the plug-in's estimate for every test light to within 0.0001
+(\`tests/host/six_channel_fit_test.cpp\`). When comparing the columns, note that the global matrix fits all six
+channels the unit reports, the clear one included, while the plug-in fits five; on those five the global matrix
+gives median 0.0105, p95 0.0365 and max 0.0462.
 EOF
 echo "accuracy: wrote $out" >&2
