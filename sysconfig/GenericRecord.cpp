@@ -5,23 +5,13 @@
 #include "calibration/DriverRecords.h"
 #include "plugin/LittleEndian.h"
 #include "sysconfig/FixedPoint.h"
+#include "sysconfig/RecordFields.h"
 
 namespace sysconfig {
 
 namespace {
 
 constexpr uint8_t kFirstGain = 9;
-
-driver::ChannelBlock channelBlock(std::span<const uint8_t> source, unsigned nGains)
-{
-    driver::ChannelBlock block;
-    block.darkCounts = le::get<uint8_t>(source, 0);
-    block.offsetCounts = int16_t(toQ8_8(float(le::get<uint16_t>(source, 1)) / 1000.0f));
-    block.channelParamB = le::get<uint8_t>(source, 3);
-    for (unsigned k = 0; k < nGains; ++k)
-        block.gainScale[k] = toQ2_14(float(le::get<uint16_t>(source, 4 + 2 * k)) / 256.0f);
-    return block;
-}
 
 } // namespace
 
@@ -30,12 +20,7 @@ CFDataRef createGenericRecord(std::span<const uint8_t> entry, const GenericEntry
     const auto spectrum = entry.subspan(layout.spectrumOffset, layout.spectrumSize);
     driver::ChannelRecord record(driver::kFourChannelRecord);
 
-    record.setHeader({.source = driver::CalibrationSource::Configuration,
-                      .calibrationVersion = entryCount,
-                      .fudge = toQ2_14(float(le::get<uint16_t>(entry, generic::kWordA)) / 256.0f),
-                      .iTime = le::get<uint16_t>(entry, generic::kWordB),
-                      .aux1 = le::get<uint16_t>(entry, generic::kWordB + 2),
-                      .aux2 = le::get<uint16_t>(entry, generic::kWordB + 4)});
+    record.setHeader(recordHeader(entry, entryCount));
     record.setGain(0, kFirstGain);
     record.setGain(1, le::get<uint8_t>(entry, generic::kGain1));
     record.setGain(2, le::get<uint8_t>(entry, generic::kGain1 + 1));

@@ -5,6 +5,7 @@
 #include "plugin/Log.h"
 #include "plugin/VantishPlugIn.h"
 #include "sysconfig/FixedPoint.h"
+#include "sysconfig/RecordFields.h"
 #include "sysconfig/SysConfigFormat.h"
 
 using namespace sysconfig;
@@ -14,16 +15,12 @@ namespace {
 constexpr unsigned kFixedGainScales = 4; // the first four gain scales are 2.0 for this chip
 constexpr uint16_t kGainScaleTwo = 0x8000; // 2.0 with 14 fraction bits
 
-driver::ChannelBlock channelBlock(std::span<const uint8_t> source, unsigned nGains)
+// A channel block: the first four gain scales are fixed, the entry's follow.
+driver::ChannelBlock vd6286ChannelBlock(std::span<const uint8_t> source, unsigned nGains)
 {
-    driver::ChannelBlock block;
-    block.darkCounts = le::get<uint8_t>(source, 0);
-    block.offsetCounts = int16_t(toQ8_8(float(le::get<uint16_t>(source, 1)) / 1000.0f));
-    block.channelParamB = int16_t(le::get<uint8_t>(source, 3));
+    driver::ChannelBlock block = channelBlock(source, nGains, kFixedGainScales);
     for (unsigned k = 0; k < kFixedGainScales; ++k)
         block.gainScale[k] = kGainScaleTwo;
-    for (unsigned k = 0; k < nGains; ++k)
-        block.gainScale[kFixedGainScales + k] = toQ2_14(float(le::get<uint16_t>(source, 4 + 2 * k)) / 256.0f);
     return block;
 }
 
@@ -31,12 +28,7 @@ driver::ChannelBlock channelBlock(std::span<const uint8_t> source, unsigned nGai
 CFDataRef createRecord(std::span<const uint8_t> entry, uint8_t entryCount, unsigned nChannels, unsigned nGains)
 {
     driver::ChannelRecord record(driver::kFiveChannelRecord);
-    record.setHeader({.source = driver::CalibrationSource::Configuration,
-                      .calibrationVersion = entryCount,
-                      .fudge = toQ2_14(float(le::get<uint16_t>(entry, generic::kWordA)) / 256.0f),
-                      .iTime = le::get<uint16_t>(entry, generic::kWordB),
-                      .aux1 = le::get<uint16_t>(entry, generic::kWordB + 2),
-                      .aux2 = le::get<uint16_t>(entry, generic::kWordB + 4)});
+    record.setHeader(recordHeader(entry, entryCount));
     for (unsigned g = 0; g < 3; ++g)
         record.setGain(g, le::get<uint8_t>(entry, vd6286::kGain0 + g));
     record.setCounts(uint8_t(nChannels), uint8_t(nGains));
@@ -46,9 +38,9 @@ CFDataRef createRecord(std::span<const uint8_t> entry, uint8_t entryCount, unsig
         record.setCctCoeff(k, float(le::get<int32_t>(entry, vd6286::kCctCoefficients + 4 * k)));
     }
     for (unsigned c = 0; c < nChannels; ++c)
-        record.setChannelBlock(c, channelBlock(entry.subspan(vd6286::kChannelBlocks + vd6286::kChannelBlockSize * c,
-                                                             vd6286::kChannelBlockSize),
-                                               nGains));
+        record.setChannelBlock(c, vd6286ChannelBlock(entry.subspan(vd6286::kChannelBlocks + vd6286::kChannelBlockSize * c,
+                                                                   vd6286::kChannelBlockSize),
+                                                     nGains));
     return record.createData();
 }
 
