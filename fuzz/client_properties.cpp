@@ -31,8 +31,6 @@ namespace {
 
 constexpr int kMaxDepth = 4;
 constexpr int kMaxCalls = 32;
-constexpr uint32_t kSources = 8;
-
 template <typename T>
 CFNumberRef number(fz::Input& in, CFNumberType type)
 {
@@ -108,21 +106,6 @@ CFStringRef key(fz::Input& in)
     return static_cast<CFStringRef>(CFRetain(known[choice % known.size()]));
 }
 
-SpectralDatabasePtr makeDatabase(uint32_t channels)
-{
-    auto db = std::make_shared<SpectralDatabase>();
-    db->allocate(kSources, channels);
-    for (uint32_t i = 0; i < kSources; ++i) {
-        for (uint32_t j = 0; j < channels; ++j)
-            db->dbChannelResponses[j * kSources + i] = float(1 + (i * 5 + j * 3) % 7);
-        db->dbXYZ[i] = 0.3f + 0.05f * float(i);
-        db->dbXYZ[kSources + i] = 0.35f;
-        db->dbXYZ[2 * kSources + i] = 0.4f - 0.03f * float(i);
-    }
-    db->dbInfo.sources = int32_t(kSources);
-    return db;
-}
-
 // An ALS event with a plain sample record of four lit channels.
 IOHIDEventRef createEvent()
 {
@@ -156,7 +139,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
         plugin->service = service;
         plugin->numberOfChannels = dbChannels;
         plugin->dbChannelCount = dbChannels;
-        plugin->publishDatabase(makeDatabase(dbChannels), true);
+        plugin->publishDatabase(fz::smallDatabase(dbChannels), true);
 
         for (int call = 0; call < kMaxCalls && in.size() > 0; ++call) {
             CFOwned<CFStringRef> k(key(in));

@@ -24,8 +24,6 @@
 
 namespace {
 
-constexpr uint32_t kSources = 8;
-
 enum Flags : uint8_t {
     kRGBCOverride = 1 << 0,
     kChromaticityOverride = 1 << 1,
@@ -36,24 +34,6 @@ enum Flags : uint8_t {
     kNotALS = 1 << 6,
     kNotReady = 1 << 7,
 };
-
-// A small database whose sources differ in their channel balance.
-SpectralDatabasePtr makeDatabase(uint32_t channels, bool normalised)
-{
-    auto db = std::make_shared<SpectralDatabase>();
-    db->allocate(kSources, channels);
-    for (uint32_t i = 0; i < kSources; ++i) {
-        for (uint32_t j = 0; j < channels; ++j)
-            db->dbChannelResponses[j * kSources + i] = float(1 + (i * 7 + j * 3) % 11);
-        db->dbXYZ[i] = 0.3f + 0.05f * float(i);
-        db->dbXYZ[kSources + i] = 0.35f;
-        db->dbXYZ[2 * kSources + i] = 0.4f - 0.03f * float(i);
-    }
-    if (normalised)
-        db->channelStdDev.assign(channels, 1.5f);
-    db->dbInfo.sources = int32_t(kSources);
-    return db;
-}
 
 IOHIDEventRef createEvent(bool als, bool withRecord, std::span<const uint8_t> record, uint64_t timeStamp)
 {
@@ -100,7 +80,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
     plugin->lambdaConfigured = (flags & kLambda) != 0;
     plugin->lambda = input.take<float>();
     const uint64_t timeStamp = input.take<uint64_t>();
-    plugin->publishDatabase(makeDatabase(dbChannels, flags & kNormalised), !(flags & kNotReady));
+    plugin->publishDatabase(fz::smallDatabase(dbChannels, flags & kNormalised), !(flags & kNotReady));
 
     const bool als = !(flags & kNotALS);
     const bool withRecord = !(flags & kNoRecord);

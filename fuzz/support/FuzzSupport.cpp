@@ -153,4 +153,22 @@ CFDataRef createData(std::span<const uint8_t> bytes)
     return CFDataCreate(kCFAllocatorDefault, bytes.data(), CFIndex(bytes.size()));
 }
 
+SpectralDatabasePtr smallDatabase(uint32_t channels, bool normalised)
+{
+    constexpr uint32_t kSources = 8;
+    auto db = std::make_shared<SpectralDatabase>();
+    db->allocate(kSources, channels);
+    for (uint32_t i = 0; i < kSources; ++i) {
+        for (uint32_t j = 0; j < channels; ++j)
+            db->dbChannelResponses[j * kSources + i] = float(1 + (i * 7 + j * 3) % 11);
+        db->dbXYZ[i] = 0.3f + 0.05f * float(i);
+        db->dbXYZ[kSources + i] = 0.35f;
+        db->dbXYZ[2 * kSources + i] = 0.4f - 0.03f * float(i);
+    }
+    if (normalised)
+        db->channelStdDev.assign(channels, 1.5f);
+    db->dbInfo.sources = int32_t(kSources);
+    return db;
+}
+
 } // namespace fz

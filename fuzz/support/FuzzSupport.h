@@ -55,6 +55,11 @@ void writeReferenceDatabase(const std::filesystem::path& file, int sources, int 
 
 void writeFile(const std::filesystem::path& file, std::span<const uint8_t> bytes);
 
+// A published-ready per-chip database of eight sources whose channel balance
+// differs, with `channels` channels; normalised (every channel's deviation
+// 1.5) when asked.
+SpectralDatabasePtr smallDatabase(uint32_t channels, bool normalised = false);
+
 // Takes option bytes from the front of an input; reads past the end give 0.
 class Input {
 public:

@@ -90,17 +90,6 @@ std::vector<Field> describe(Kind kind, std::span<const uint8_t> bytes)
     return d.fields();
 }
 
-std::string hexOf(std::span<const uint8_t> bytes)
-{
-    static const char digits[] = "0123456789abcdef";
-    std::string out;
-    for (uint8_t b : bytes) {
-        out += digits[b >> 4];
-        out += digits[b & 15];
-    }
-    return out;
-}
-
 // Runs of bytes no field covers, as {"offset", "hex"}.
 Json unnamedRuns(const std::vector<Field>& fields, std::span<const uint8_t> bytes)
 {

@@ -83,17 +83,6 @@ void writeInteger(FieldType type, std::span<uint8_t> bytes, size_t at, int64_t v
     }
 }
 
-std::string hexOf(std::span<const uint8_t> bytes)
-{
-    static const char digits[] = "0123456789abcdef";
-    std::string out;
-    for (uint8_t b : bytes) {
-        out += digits[b >> 4];
-        out += digits[b & 15];
-    }
-    return out;
-}
-
 [[noreturn]] void fail(const Field& f, const std::string& why)
 {
     throw std::runtime_error(pathText(f.path) + ": " + why);
@@ -411,6 +400,17 @@ std::string pathText(const std::vector<PathStep>& path)
             out += (out.empty() ? "" : ".") + *key;
         else
             out += "[" + std::to_string(std::get<size_t>(step)) + "]";
+    }
+    return out;
+}
+
+std::string hexOf(std::span<const uint8_t> bytes)
+{
+    static const char digits[] = "0123456789abcdef";
+    std::string out;
+    for (uint8_t b : bytes) {
+        out += digits[b >> 4];
+        out += digits[b & 15];
     }
     return out;
 }

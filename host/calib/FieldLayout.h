@@ -85,5 +85,7 @@ const Json* findAtPath(const Json& root, const std::vector<PathStep>& path);
 // The node at `path`, created (objects and arrays as needed).
 Json& makeAtPath(Json& root, const std::vector<PathStep>& path);
 std::string pathText(const std::vector<PathStep>& path);
+// Bytes as lower-case hex digits, two per byte.
+std::string hexOf(std::span<const uint8_t> bytes);
 
 } // namespace calibcodec
