@@ -48,16 +48,11 @@ struct Writer {
 
 TEST(CalibCodecTest, EveryFixedSizeRecordRoundTripsWhateverItsBytes)
 {
-    for (Kind kind : calibcodec::allKinds()) {
-        if (kind == Kind::AlsCalibration || kind == Kind::AlsAuxCalibration)
-            continue;
-        for (size_t size : {5156, 10236, 9962, 10440, 10348, 145, 193, 220, 776, 28163}) {
-            if (calibcodec::kindForSize(size) != kind)
-                continue;
-            SCOPED_TRACE(std::string(calibcodec::kindName(kind)) + " " + std::to_string(size));
-            const std::vector<uint8_t> bytes = randomBytes(size, unsigned(size));
-            EXPECT_EQ(roundTrip(bytes), bytes);
-        }
+    for (size_t size : {5156, 10236, 9962, 10440, 10348, 145, 193, 220, 776, 28163}) {
+        SCOPED_TRACE(size);
+        ASSERT_TRUE(calibcodec::kindForSize(size));
+        const std::vector<uint8_t> bytes = randomBytes(size, unsigned(size));
+        EXPECT_EQ(roundTrip(bytes), bytes);
     }
 }
 

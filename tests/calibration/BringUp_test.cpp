@@ -52,13 +52,20 @@ TEST_F(BringUpTest, BootArgumentForcesTheDefaultWhateverItsValue)
     }
 }
 
+// Also when the boot arguments ask for the default but cannot be read.
 TEST_F(BringUpTest, FactoryCalibrationLeavesCrgbAlone)
 {
-    writeStore("XwCA", ct::makeXwCA({}).vec());
-    plugin->runCalibrationBringUp();
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "QVT Calibration has been loaded successfully"));
-    EXPECT_EQ(crgb(), -1);
-    EXPECT_EQ(ct::rd32(received("ALSCalibrationData"), 1), 2u); // factory store
+    for (int sysctlError : {0, EPERM}) {
+        SCOPED_TRACE(sysctlError);
+        VPSetBootArgs(sysctlError ? "als_default_calibration=1" : "debug=0x14e");
+        VPSetSysctlFailure(sysctlError);
+        writeStore("XwCA", ct::makeXwCA({}).vec());
+        plugin->runCalibrationBringUp();
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "QVT Calibration has been loaded successfully"));
+        EXPECT_FALSE(log.contains("boot-args are set to use default calibration"));
+        EXPECT_EQ(crgb(), -1);
+        EXPECT_EQ(ct::rd32(received("ALSCalibrationData"), 1), 2u); // factory store
+    }
 }
 
 TEST_F(BringUpTest, FailedOrRejectedCalibrationFallsBackToTheDefault)
@@ -71,16 +78,6 @@ TEST_F(BringUpTest, FailedOrRejectedCalibrationFallsBackToTheDefault)
     writeStore("XwCA", ct::makeXwCA({.nChannels = 9}).vec());
     plugin->runCalibrationBringUp();
     expectDefaultPath();
-}
-
-TEST_F(BringUpTest, UnreadableBootArgumentsDoNotForceTheDefault)
-{
-    VPSetBootArgs("als_default_calibration=1");
-    VPSetSysctlFailure(EPERM);
-    writeStore("XwCA", ct::makeXwCA({}).vec());
-    plugin->runCalibrationBringUp();
-    EXPECT_EQ(crgb(), -1);
-    EXPECT_FALSE(log.contains("boot-args are set to use default calibration"));
 }
 
 } // namespace

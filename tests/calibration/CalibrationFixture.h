@@ -68,6 +68,14 @@ inline std::vector<uint8_t> bytesOf(CFDataRef data)
     const UInt8* p = CFDataGetBytePtr(data);
     return {p, p + CFDataGetLength(data)};
 }
+// The bytes of a data object the caller owns, which is released.
+inline std::vector<uint8_t> takeBytes(CFDataRef data)
+{
+    std::vector<uint8_t> out = bytesOf(data);
+    if (data)
+        CFRelease(data);
+    return out;
+}
 
 inline uint32_t rd32(const std::vector<uint8_t>& b, size_t at)
 {

@@ -64,30 +64,21 @@ TEST_F(DefaultCalibrationTest, FourChannelRecordFollowsTypeAndDeviceColour)
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Calibrate sensor with default calibration data. Sensor type = 2"));
 }
 
-TEST_F(DefaultCalibrationTest, FiveChannelRecordIsTheSameForTypes5To7)
+TEST_F(DefaultCalibrationTest, WideRecordsForFiveAndSixChannelTypes)
 {
-    const Bytes want = wideRecord(193, 5, 0.0086f, 68, 25, 7);
-    for (eALSSensorType type : {eALSSensorType5ChannelA, eALSSensorType5ChannelB, eALSSensorType5ChannelC}) {
+    const Bytes five = wideRecord(193, 5, 0.0086f, 68, 25, 7), six = wideRecord(220, 6, 0.086f, 76, 24, 6);
+    for (eALSSensorType type : {eALSSensorType5ChannelA, eALSSensorType5ChannelB, eALSSensorType5ChannelC,
+                                eALSSensorType6ChannelA, eALSSensorType6ChannelB}) {
         SCOPED_TRACE(type);
+        const bool sixChannels = type == eALSSensorType6ChannelA || type == eALSSensorType6ChannelB;
         plugin->chipType = 2;
         EXPECT_TRUE(plugin->calibrateSensorWithDefaultCalibration(type));
-        EXPECT_BYTES_EQ(received("ALSCalibrationData"), want.vec());
+        EXPECT_BYTES_EQ(received("ALSCalibrationData"), (sixChannels ? six : five).vec());
         EXPECT_EQ(plugin->chipType.load(), 0u);
-        EXPECT_EQ(plugin->numberOfChannels.load(), 5u);
+        EXPECT_EQ(plugin->numberOfChannels.load(), sixChannels ? 6u : 5u);
         EXPECT_EQ(plugin->dbChannelCount.load(), 5u);
     }
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "luxCoeff[4]=0.008600"));
-}
-
-TEST_F(DefaultCalibrationTest, SixChannelRecordForTypes3And4)
-{
-    const Bytes want = wideRecord(220, 6, 0.086f, 76, 24, 6);
-    for (eALSSensorType type : {eALSSensorType6ChannelA, eALSSensorType6ChannelB}) {
-        EXPECT_TRUE(plugin->calibrateSensorWithDefaultCalibration(type));
-        EXPECT_BYTES_EQ(received("ALSCalibrationData"), want.vec());
-        EXPECT_EQ(plugin->numberOfChannels.load(), 6u);
-        EXPECT_EQ(plugin->dbChannelCount.load(), 5u);
-    }
     EXPECT_EQ(log.count("luxCoeff[5]=0.086000"), 2u);
 }
 

@@ -141,11 +141,7 @@ protected:
         db.allocate(sources, rows);
         for (size_t i = 0; i < db.dbChannelResponses.size(); ++i)
             db.dbChannelResponses[i] = float(i + 1);
-        CFDataRef record = calib::createColorCalibrationRecord(db, channelCount);
-        std::vector<uint8_t> out = ct::bytesOf(record);
-        if (record)
-            CFRelease(record);
-        return out;
+        return ct::takeBytes(calib::createColorCalibrationRecord(db, channelCount));
     }
 };
 

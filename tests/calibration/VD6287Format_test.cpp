@@ -15,22 +15,16 @@ protected:
         const bool parsed = plugin->processQVTCalibrationVD6287_XwClv3(data, record);
         if (ok)
             *ok = parsed;
-        std::vector<uint8_t> out = ct::bytesOf(record);
-        if (record)
-            CFRelease(record);
         CFRelease(data);
-        return out;
+        return ct::takeBytes(record);
     }
 
     std::vector<uint8_t> convert(const Bytes& v1)
     {
         CFDataRef data = v1.data();
-        CFDataRef v3 = plugin->convertSorvelXwClv1Tov3(data);
-        std::vector<uint8_t> out = ct::bytesOf(v3);
-        if (v3)
-            CFRelease(v3);
+        std::vector<uint8_t> v3 = ct::takeBytes(plugin->convertSorvelXwClv1Tov3(data));
         CFRelease(data);
-        return out;
+        return v3;
     }
 };
 

@@ -40,39 +40,40 @@ Bytes expectedRecord(const XwCAShape& s, unsigned gain, unsigned iTime, unsigned
     return b;
 }
 
-TEST_F(XwCAT2FormatTest, VersionAbove16TakesTimingFromTheRecord)
+// Versions above 1.6 take gain and timing from the record (gain index 12 with
+// 5 gains is gain 16), 1.6 uses fixed timing, and version 1.7 of the model with
+// the timing fault gets corrected timing.
+TEST_F(XwCAT2FormatTest, TimingFollowsVersionAndModel)
 {
-    const XwCAShape shape; // version 1.7, gain index 12 with 5 gains, iTime 180
-    VPTessarySetProductType(stored::xwca::kProductTypeWithTimingFault + 1);
-    ASSERT_TRUE(load(shape));
-    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(shape, 12 - 5 + 9, 180, 0x4100).vec());
+    const uint32_t faulty = stored::xwca::kProductTypeWithTimingFault;
+    struct Case {
+        uint32_t productType;
+        XwCAShape shape;
+        unsigned gain, iTime, fudge;
+    };
+    const Case cases[] = {
+        {faulty + 1, {}, 16, 180, 0x4100},
+        {faulty + 1, {.major = 1, .minor = 6, .nGains = 3, .gainIndex = 200, .iTime = -7}, 6, 150, 0x4100},
+        {faulty, {}, 16, 250, 0x4CCC},
+        {faulty, {.minor = 8}, 16, 180, 0x4100},
+    };
+    const std::string workaround = "WORKAROUND: override iTime (180 -> 250) and fudge (16640 -> 19660)";
+    size_t workarounds = 0;
+    for (const Case& c : cases) {
+        SCOPED_TRACE(testing::Message() << "product " << c.productType << " version 1." << int(c.shape.minor));
+        VPTessarySetProductType(c.productType);
+        ASSERT_TRUE(load(c.shape));
+        EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(c.shape, c.gain, c.iTime, c.fudge).vec());
+        workarounds += c.iTime == 250;
+        EXPECT_EQ(log.count(workaround), workarounds);
+    }
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, workaround));
     EXPECT_FLOAT_EQ(plugin->smallDBVersion.load(), 1.3f);
     EXPECT_EQ(plugin->numberOfChannels.load(), 5u);
     EXPECT_EQ(plugin->dbChannelCount.load(), 5u);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "processQVTCalibrationXwCAT2: gain = 16, iTime = 180"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "processQVTCalibrationXwCAT2: luxCoeff[0]=0.007812, "
                                                   "cctCoeff[0]=-3.000000, offsetCounts[0]=-50/255 darkCounts[0] = -112"));
-    EXPECT_FALSE(log.contains("WORKAROUND: override iTime (180 -> 250) and fudge (16640 -> 19660)"));
-}
-
-TEST_F(XwCAT2FormatTest, Version16UsesFixedTiming)
-{
-    const XwCAShape shape{.major = 1, .minor = 6, .nGains = 3, .gainIndex = 200, .iTime = -7};
-    ASSERT_TRUE(load(shape));
-    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(shape, 6, 150, 0x4100).vec());
-}
-
-TEST_F(XwCAT2FormatTest, Version17OfTheFaultyModelGetsCorrectedTiming)
-{
-    VPTessarySetProductType(stored::xwca::kProductTypeWithTimingFault);
-    const XwCAShape shape;
-    ASSERT_TRUE(load(shape));
-    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(shape, 16, 250, 0x4CCC).vec());
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "WORKAROUND: override iTime (180 -> 250) and fudge (16640 -> 19660)"));
-
-    const XwCAShape later{.minor = 8};
-    ASSERT_TRUE(load(later));
-    EXPECT_BYTES_EQ(received("ALSCalibrationData"), expectedRecord(later, 16, 180, 0x4100).vec());
 }
 
 TEST_F(XwCAT2FormatTest, ChipIdIsReadAsHexadecimalText)

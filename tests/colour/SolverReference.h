@@ -55,30 +55,21 @@ inline Problem randomProblem(int N, int M, unsigned seed, Weights kind = Weights
     return p;
 }
 
+using RowMajor = Eigen::Matrix<float, Eigen::Dynamic, Eigen::Dynamic, Eigen::RowMajor>;
+
 inline Eigen::MatrixXd responses(const Problem& p)
 {
-    Eigen::MatrixXd R(p.M, p.N);
-    for (int j = 0; j < p.M; ++j)
-        for (int i = 0; i < p.N; ++i)
-            R(j, i) = p.R[size_t(j) * p.N + i];
-    return R;
+    return Eigen::Map<const RowMajor>(p.R.data(), p.M, p.N).cast<double>();
 }
 
 inline Eigen::MatrixXd targets(const Problem& p)
 {
-    Eigen::MatrixXd T(p.N, 3);
-    for (int c = 0; c < 3; ++c)
-        for (int i = 0; i < p.N; ++i)
-            T(i, c) = p.T[size_t(c) * p.N + i];
-    return T;
+    return Eigen::Map<const RowMajor>(p.T.data(), 3, p.N).transpose().cast<double>();
 }
 
 inline Eigen::VectorXd weights(const Problem& p)
 {
-    Eigen::VectorXd w(p.N);
-    for (int i = 0; i < p.N; ++i)
-        w(i) = p.w[i];
-    return w;
+    return Eigen::Map<const Eigen::VectorXf>(p.w.data(), p.N).cast<double>();
 }
 
 // (R W R^T + lambda I)^-1 R W T^T, M x 3.
@@ -102,11 +93,7 @@ inline Eigen::MatrixXd minimumNorm(const Problem& p)
 // A solver's result rows (M x 4 floats) as an M x 3 matrix.
 inline Eigen::MatrixXd coefficients(const std::vector<float>& H, int M)
 {
-    Eigen::MatrixXd out(M, 3);
-    for (int j = 0; j < M; ++j)
-        for (int c = 0; c < 3; ++c)
-            out(j, c) = H[size_t(4) * j + c];
-    return out;
+    return Eigen::Map<const RowMajor>(H.data(), M, 4).leftCols(3).cast<double>();
 }
 
 // Largest element difference relative to the largest element of the reference.

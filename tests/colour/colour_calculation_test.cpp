@@ -1,5 +1,5 @@
 // The per-event colour estimate against an independent double-precision
-// reference, its guards, and the lines it logs.
+// reference, its guards, and the lines it logs; and the matrix helpers it uses.
 #include "SolverReference.h"
 #include "plugin/VantishPlugIn.h"
 #include "support/TestSupport.h"
@@ -62,40 +62,46 @@ void normaliseDatabase(VantishPlugIn* plugin, SpectralDatabase& db)
                 db.dbChannelResponses[size_t(j) * N + i] /= db.channelStdDev[j];
 }
 
-// The calculation written out in double precision with Eigen.
-Eigen::Vector3d reference(const SpectralDatabase& db, std::vector<float> measured, bool normalised, double lambda,
-                          double exponent = 2.0, double offset = double(0.00001f))
+// The channel deviation the calculation scales by, 1 where there is none.
+double deviation(const SpectralDatabase& db, int j, bool normalised)
+{
+    return normalised && !db.channelStdDev.empty() && db.channelStdDev[j] != 0.0f ? db.channelStdDev[j] : 1.0;
+}
+
+// Each sample's weight, 1 / (1 - cos(sample, x) + offset)^2, in float as the calculation keeps them.
+std::vector<float> referenceWeights(const SpectralDatabase& db, const Eigen::VectorXd& x, bool normalised)
 {
     int N = int(db.dbSampleCount), M = int(db.dbChannelCount);
-    Eigen::VectorXd x(M);
-    for (int j = 0; j < M; ++j)
-        x(j) = measured[j];
+    std::vector<float> w(N);
+    for (int i = 0; i < N; ++i) {
+        Eigen::VectorXd q(M);
+        for (int j = 0; j < M; ++j)
+            q(j) = db.dbChannelResponses[size_t(j) * N + i] * deviation(db, j, normalised);
+        double cosine = q.dot(x) / (q.norm() * x.norm());
+        w[i] = float(1.0 / std::pow(1.0 - cosine + double(0.00001f), 2.0));
+    }
+    return w;
+}
+
+// The calculation written out in double precision with Eigen.
+Eigen::Vector3d reference(const SpectralDatabase& db, std::vector<float> measured, bool normalised, double lambda)
+{
+    int M = int(db.dbChannelCount);
+    Eigen::VectorXd x = Eigen::Map<const Eigen::VectorXf>(measured.data(), M).cast<double>();
     if (normalised)
         x.normalize();
     Problem p;
-    p.N = N;
+    p.N = int(db.dbSampleCount);
     p.M = M;
     p.R = db.dbChannelResponses;
     p.T = db.dbXYZ;
-    p.w.resize(N);
-    for (int i = 0; i < N; ++i) {
-        Eigen::VectorXd q(M);
-        for (int j = 0; j < M; ++j) {
-            double sigma = normalised && !db.channelStdDev.empty() && db.channelStdDev[j] != 0.0f
-                               ? db.channelStdDev[j]
-                               : 1.0;
-            q(j) = db.dbChannelResponses[size_t(j) * N + i] * sigma;
-        }
-        double cosine = q.dot(x) / (q.norm() * x.norm());
-        p.w[i] = float(1.0 / std::pow(1.0 - cosine + offset, exponent));
-    }
+    p.w = referenceWeights(db, x, normalised);
     if (normalised) {
         float largest = *std::max_element(p.w.begin(), p.w.end());
         for (float& w : p.w)
             w /= largest;
         for (int j = 0; j < M; ++j)
-            if (!db.channelStdDev.empty() && db.channelStdDev[j] != 0.0f)
-                x(j) /= db.channelStdDev[j];
+            x(j) /= deviation(db, j, true);
     }
     Eigen::Vector3d xyz = closedForm(p, lambda).transpose() * x;
     return xyz.cwiseMax(0.0);
@@ -118,9 +124,18 @@ std::string colourLine(const XYZ& xyz)
 const std::vector<float> kMeasured4 = {0.8f, 0.3f, 0.55f, 0.2f};
 const std::vector<float> kMeasured5 = {0.2f, 0.9f, 0.4f, 0.35f, 0.6f};
 
+const std::vector<float>& measured(int M) { return M == 4 ? kMeasured4 : kMeasured5; }
+
+// Normalised mode with the lambda a configured device uses.
+void useNormalisedMode(PlugIn& plugin)
+{
+    plugin->lambdaConfigured = 1;
+    plugin->lambda = 0.01f;
+}
+
 } // namespace
 
-TEST(ColourCalculation, RejectsMissingArgumentsSilently)
+TEST(ColourCalculation, RejectsBadArgumentsAndForeignDatabasesSilently)
 {
     PlugIn plugin;
     SpectralDatabase db = makeDatabase(50, 4, 1);
@@ -131,16 +146,6 @@ TEST(ColourCalculation, RejectsMissingArgumentsSilently)
     EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), nullptr, 4));
     EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 0));
     EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), -3));
-    EXPECT_EQ(xyz, (XYZ{-1.0f, 2.0f, 3.0f}));
-    EXPECT_TRUE(log.lines().empty());
-}
-
-TEST(ColourCalculation, RunsOnlyAgainstADatabaseMadeForTheChannels)
-{
-    PlugIn plugin;
-    std::vector<float> x = kMeasured4;
-    XYZ xyz = {-1.0f, 2.0f, 3.0f};
-    vt::LogCapture log;
     SpectralDatabase empty;
     empty.allocate(0, 4);
     EXPECT_FALSE(plugin->colourCalculationDynamic(empty, x.data(), xyz.data(), 4));
@@ -159,8 +164,7 @@ TEST(ColourCalculation, RunsOnlyAgainstADatabaseMadeForTheChannels)
 TEST(ColourCalculation, AllZeroChannelsTakeTheShortcut)
 {
     PlugIn plugin;
-    plugin->lambdaConfigured = 1;
-    plugin->lambda = 0.01f;
+    useNormalisedMode(plugin);
     SpectralDatabase db = makeDatabase(50, 4, 4);
     std::vector<float> x(4, 0.0f);
     XYZ xyz = {5.0f, 5.0f, 5.0f};
@@ -172,54 +176,42 @@ TEST(ColourCalculation, AllZeroChannelsTakeTheShortcut)
                                                         "Z=0.000000(0.000000) \n"}));
 }
 
-TEST(ColourCalculation, RawModeMatchesTheReference)
+TEST(ColourCalculation, EveryModeMatchesTheReference)
 {
-    PlugIn plugin;
-    for (int M : {4, 5}) {
-        SpectralDatabase db = makeDatabase(400, M, 10u + M);
-        std::vector<float> x = M == 4 ? kMeasured4 : kMeasured5;
-        XYZ xyz{};
-        EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), M));
-        expectClose(xyz, reference(db, M == 4 ? kMeasured4 : kMeasured5, false, 0.0), 1e-4);
-        // Without normalisation the measurement is not touched.
-        EXPECT_EQ(x, M == 4 ? kMeasured4 : kMeasured5);
-    }
-}
-
-TEST(ColourCalculation, ClientLambdaWithoutNormalisationMatchesTheReference)
-{
-    // Raw weights reach far above 100, so the fit goes through the augmented system.
-    PlugIn plugin;
-    plugin->lambda = 0.5f;
-    for (int M : {4, 5}) {
-        SpectralDatabase db = makeDatabase(400, M, 20u + M);
-        std::vector<float> x = M == 4 ? kMeasured4 : kMeasured5;
-        XYZ xyz{};
-        EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), M));
-        expectClose(xyz, reference(db, M == 4 ? kMeasured4 : kMeasured5, false, 0.5), 1e-4);
-    }
-}
-
-TEST(ColourCalculation, NormalisedModeMatchesTheReference)
-{
-    PlugIn plugin;
-    plugin->lambdaConfigured = 1;
-    plugin->lambda = 0.01f;
-    for (int M : {4, 5}) {
-        SpectralDatabase db = makeDatabase(400, M, 30u + M);
-        normaliseDatabase(plugin.p, db);
-        std::vector<float> x = M == 4 ? kMeasured4 : kMeasured5;
-        XYZ xyz{};
-        EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), M));
-        expectClose(xyz, reference(db, M == 4 ? kMeasured4 : kMeasured5, true, 0.01), 1e-4);
+    struct Mode {
+        const char* what;
+        bool configured; // normalised, with the configured lambda
+        float lambda;
+        unsigned seed;
+    };
+    // A client lambda without normalisation: raw weights reach far above 100,
+    // so the fit goes through the augmented system.
+    for (const Mode& mode : {Mode{"raw", false, 0.0f, 10}, Mode{"raw with client lambda", false, 0.5f, 20},
+                             Mode{"normalised", true, 0.01f, 30}}) {
+        for (int M : {4, 5}) {
+            SCOPED_TRACE(testing::Message() << mode.what << ", M=" << M);
+            PlugIn plugin;
+            plugin->lambdaConfigured = mode.configured;
+            plugin->lambda = mode.lambda;
+            SpectralDatabase db = makeDatabase(400, M, mode.seed + M);
+            if (mode.configured)
+                normaliseDatabase(plugin.p, db);
+            std::vector<float> x = measured(M);
+            XYZ xyz{};
+            EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), M));
+            expectClose(xyz, reference(db, measured(M), mode.configured, mode.lambda), 1e-4);
+            // Without normalisation the measurement is not touched.
+            if (!mode.configured) {
+                EXPECT_EQ(x, measured(M));
+            }
+        }
     }
 }
 
 TEST(ColourCalculation, ChannelsWithoutSpreadStayUnscaled)
 {
     PlugIn plugin;
-    plugin->lambdaConfigured = 1;
-    plugin->lambda = 0.01f;
+    useNormalisedMode(plugin);
     SpectralDatabase db = makeDatabase(300, 4, 40);
     normaliseDatabase(plugin.p, db);
     db.channelStdDev[2] = 0.0f; // as calibration leaves a channel that does not vary
@@ -248,51 +240,12 @@ TEST(ColourCalculation, ScalingTheMeasurementKeepsTheWeights)
     for (int c = 0; c < 3; ++c)
         EXPECT_NEAR(many[c], 37.5f * one[c], 1e-5 * 37.5f * one[c]);
     // Normalised mode: the measurement's scale is gone before the fit.
-    plugin->lambdaConfigured = 1;
-    plugin->lambda = 0.01f;
+    useNormalisedMode(plugin);
     normaliseDatabase(plugin.p, db);
     one = colour(1.0f);
     many = colour(37.5f);
     for (int c = 0; c < 3; ++c)
         EXPECT_NEAR(many[c], one[c], 1e-5 * one[c]);
-}
-
-TEST(ColourCalculation, ZeroSampleVectorStopsTheCalculation)
-{
-    PlugIn plugin;
-    SpectralDatabase db = makeDatabase(50, 4, 60);
-    for (int j = 0; j < 4; ++j)
-        db.dbChannelResponses[size_t(j) * 50 + 17] = 0.0f;
-    std::vector<float> x = kMeasured4;
-    XYZ xyz = {1.0f, -2.0f, 3.0f};
-    vt::LogCapture log;
-    EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 4));
-    EXPECT_EQ(xyz, (XYZ{1.0f, 0.0f, 3.0f}));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "QiQi x QtQt == 0.000000, can not proceed with color calculation \n"));
-    EXPECT_EQ(log.messages().back(), "Color: X=1.000000(0.318310) Y=0.000000(0.000000) Z=3.000000(0.954930) \n");
-    EXPECT_EQ(log.lines().size(), 2u);
-}
-
-TEST(ColourCalculation, ZeroDistanceStopsTheCalculation)
-{
-    PlugIn plugin;
-    SpectralDatabase db = makeDatabase(50, 4, 70);
-    // Sample 9 points exactly where the measurement does.
-    const std::vector<float> direction = {1.0f, 2.0f, 3.0f, 4.0f};
-    for (int j = 0; j < 4; ++j)
-        db.dbChannelResponses[size_t(j) * 50 + 9] = direction[j];
-    std::vector<float> x = direction;
-    XYZ xyz = {-1.0f, -1.0f, 2.0f};
-    // With the default offset the distance cannot reach zero.
-    EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 4));
-    plugin->weightOffset = 0.0f;
-    xyz = {-1.0f, -1.0f, 2.0f};
-    vt::LogCapture log;
-    EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 4));
-    EXPECT_EQ(xyz, (XYZ{0.0f, 0.0f, 2.0f}));
-    EXPECT_EQ(log.messages(), (std::vector<std::string>{"di+c == 0, can not proceed with color calculation \n",
-                                                        colourLine(xyz)}));
-    EXPECT_EQ(log.lines().front().type, OS_LOG_TYPE_INFO);
 }
 
 TEST(ColourCalculation, NegativeComponentsAreReportedAsZero)
@@ -311,6 +264,48 @@ TEST(ColourCalculation, NegativeComponentsAreReportedAsZero)
     EXPECT_GT(xyz[0], 0.0f);
 }
 
+// A calculation that stops: what the caller's result held is kept, but Y
+// is zeroed and negatives clamped, and the reason is logged just before the colour.
+static void expectStopped(PlugIn& plugin, const SpectralDatabase& db, std::vector<float> x, const std::string& reason,
+                          size_t lineCount = 2)
+{
+    XYZ xyz = {-1.0f, -2.0f, 3.0f};
+    vt::LogCapture log;
+    EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), int(x.size())));
+    EXPECT_EQ(xyz, (XYZ{0.0f, 0.0f, 3.0f}));
+    std::vector<std::string> lines = log.messages();
+    ASSERT_EQ(lines.size(), lineCount);
+    EXPECT_EQ(std::vector<std::string>(lines.end() - 2, lines.end()),
+              (std::vector<std::string>{reason,
+                                        "Color: X=0.000000(0.000000) Y=0.000000(0.000000) Z=3.000000(0.954930) \n"}));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, reason));
+}
+
+TEST(ColourCalculation, ZeroSampleVectorStopsTheCalculation)
+{
+    PlugIn plugin;
+    SpectralDatabase db = makeDatabase(50, 4, 60);
+    for (int j = 0; j < 4; ++j)
+        db.dbChannelResponses[size_t(j) * 50 + 17] = 0.0f;
+    expectStopped(plugin, db, kMeasured4, "QiQi x QtQt == 0.000000, can not proceed with color calculation \n");
+}
+
+TEST(ColourCalculation, ZeroDistanceStopsTheCalculation)
+{
+    PlugIn plugin;
+    SpectralDatabase db = makeDatabase(50, 4, 70);
+    // Sample 9 points exactly where the measurement does.
+    const std::vector<float> direction = {1.0f, 2.0f, 3.0f, 4.0f};
+    for (int j = 0; j < 4; ++j)
+        db.dbChannelResponses[size_t(j) * 50 + 9] = direction[j];
+    std::vector<float> x = direction;
+    XYZ xyz{};
+    // With the default offset the distance cannot reach zero.
+    EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 4));
+    plugin->weightOffset = 0.0f;
+    expectStopped(plugin, db, direction, "di+c == 0, can not proceed with color calculation \n");
+}
+
 TEST(ColourCalculation, AFailedFitNeverBecomesAColour)
 {
     // A client lambda far below zero makes the regularised matrix indefinite.
@@ -319,20 +314,14 @@ TEST(ColourCalculation, AFailedFitNeverBecomesAColour)
     plugin->lambda = -1e6f;
     SpectralDatabase db = makeDatabase(100, 4, 90);
     normaliseDatabase(plugin.p, db);
-    std::vector<float> x = kMeasured4;
-    XYZ xyz = {4.0f, -5.0f, 6.0f};
-    vt::LogCapture log;
-    EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 4));
-    EXPECT_EQ(xyz, (XYZ{4.0f, 0.0f, 6.0f}));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Color fit failed, can not proceed with color calculation \n"));
-    EXPECT_EQ(log.messages().back(), colourLine(xyz));
+    // Normalised mode logs its two steps first.
+    expectStopped(plugin, db, kMeasured4, "Color fit failed, can not proceed with color calculation \n", 4);
 }
 
 TEST(ColourCalculation, NormalisedModeLogsItsSteps)
 {
     PlugIn plugin;
-    plugin->lambdaConfigured = 1;
-    plugin->lambda = 0.01f;
+    useNormalisedMode(plugin);
     SpectralDatabase db = makeDatabase(60, 4, 100);
     normaliseDatabase(plugin.p, db);
     std::vector<float> x = {3.0f, 4.0f, 0.0f, 0.0f};
@@ -342,19 +331,83 @@ TEST(ColourCalculation, NormalisedModeLogsItsSteps)
     std::vector<std::string> lines = log.messages();
     ASSERT_EQ(lines.size(), 3u);
     EXPECT_EQ(lines[0], "Normalization - Euklid norm = 5.000000\n");
-    // The largest weight belongs to the sample closest in direction to (0.6, 0.8, 0, 0).
-    double largest = 0.0;
-    for (int i = 0; i < 60; ++i) {
-        Eigen::Vector4d q;
-        for (int j = 0; j < 4; ++j)
-            q(j) = double(db.dbChannelResponses[size_t(j) * 60 + i]) * db.channelStdDev[j];
-        double cosine = (0.6 * q(0) + 0.8 * q(1)) / q.norm();
-        largest = std::max(largest, double(float(1.0 / std::pow(1.0 - cosine + double(0.00001f), 2.0))));
-    }
+    std::vector<float> weights = referenceWeights(db, Eigen::Vector4d(0.6, 0.8, 0.0, 0.0), true);
+    double largest = *std::max_element(weights.begin(), weights.end());
     char expected[80];
     std::snprintf(expected, sizeof expected, "Normalization - Max WW = %f \n", largest);
     EXPECT_EQ(lines[1], expected);
     EXPECT_EQ(lines[2], colourLine(xyz));
     for (const VPLogLine& line : log.lines())
         EXPECT_EQ(line.type, OS_LOG_TYPE_DEBUG);
+}
+
+TEST(EuklidNorm, ScalesEachSampleToUnitLength)
+{
+    PlugIn plugin;
+    vt::LogCapture log;
+    float v[2] = {3.0f, 4.0f};
+    plugin->normalizedByEuklidNorm(v, 1, 2);
+    EXPECT_EQ(v[0], 0.6f);
+    EXPECT_EQ(v[1], 0.8f);
+    EXPECT_EQ(log.messages(), std::vector<std::string>{"Normalization - Euklid norm = 5.000000\n"});
+    // The float pair (0.6, 0.8) is slightly longer than 1, so it is scaled again.
+    plugin->normalizedByEuklidNorm(v, 1, 2);
+    EXPECT_EQ(log.lines().size(), 2u);
+
+    // A 2 x 3 matrix: three samples, each a column with stride 3.
+    float m[6] = {3.0f, 1.0f, 0.0f, 4.0f, 0.0f, 0.0f};
+    log.clear();
+    plugin->normalizedByEuklidNorm(m, 3, 2);
+    const float want[6] = {0.6f, 1.0f, 0.0f, 0.8f, 0.0f, 0.0f};
+    for (int k = 0; k < 6; ++k)
+        EXPECT_EQ(m[k], want[k]) << k;
+    // Only the first sample needed scaling; unit and zero samples log nothing.
+    EXPECT_EQ(log.messages(), std::vector<std::string>{"Normalization - Euklid norm = 5.000000\n"});
+    EXPECT_EQ(log.lines().front().type, OS_LOG_TYPE_DEBUG);
+
+    log.clear();
+    plugin->normalizedByEuklidNorm(nullptr, 1, 2);
+    plugin->normalizedByEuklidNorm(v, 0, 2);
+    EXPECT_TRUE(log.lines().empty());
+}
+
+TEST(StandardDeviation, PopulationFormPerRow)
+{
+    PlugIn plugin;
+    vt::LogCapture log;
+    float rows[8] = {1, 2, 3, 4, 7, 7, 7, 7};
+    float out[2] = {-1.0f, -1.0f};
+    plugin->calculateSTD(rows, out, 4, 2);
+    EXPECT_FLOAT_EQ(out[0], std::sqrt(1.25f));
+    EXPECT_EQ(out[1], 0.0f);
+    EXPECT_EQ(log.messages(), (std::vector<std::string>{"Standard deviation[0]: 1.118034\n",
+                                                        "Standard deviation[1]: 0.000000\n"}));
+
+    float untouched[1] = {-1.0f};
+    plugin->calculateSTD(rows, untouched, 0, 1);
+    plugin->calculateSTD(rows, untouched, 4, 0);
+    plugin->calculateSTD(nullptr, untouched, 4, 1);
+    plugin->calculateSTD(rows, nullptr, 4, 1);
+    EXPECT_EQ(untouched[0], -1.0f);
+}
+
+TEST(MatrixProduct, RowMajorWithSizeCheck)
+{
+    PlugIn plugin;
+    float A[12] = {1, 2, 3, 4, 0, 1, 0, 1, -1, 0.5f, 2, 0};
+    float B[5] = {1, 2, 3, 4, 5};
+    float C[3] = {9, 9, 9};
+    EXPECT_TRUE(plugin->multiplyMatrices(A, 3, 4, B, 4, 1, C));
+    EXPECT_EQ(C[0], 30.0f);
+    EXPECT_EQ(C[1], 6.0f);
+    EXPECT_EQ(C[2], 6.0f);
+
+    float untouched[3] = {9, 9, 9};
+    vt::LogCapture log;
+    EXPECT_FALSE(plugin->multiplyMatrices(A, 3, 4, B, 5, 1, untouched));
+    EXPECT_EQ(untouched[0], 9.0f);
+    EXPECT_EQ(untouched[2], 9.0f);
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "wrong matrix size \n"));
+    // Nothing to compute is still a match.
+    EXPECT_TRUE(plugin->multiplyMatrices(A, 0, 4, B, 4, 1, untouched));
 }

@@ -67,49 +67,37 @@ TEST_F(CacheFaults, FolderVanishingDuringAWrite)
     EXPECT_TRUE(cacheValidFor(kSecondReference, kFactorySmallVersion));
 }
 
-// A statement failing in the middle of the write: inserts into XX are refused.
+// A write failing part-way: a statement refused (inserts into XX), and SQLite's
+// page limit standing in for a disk that fills up (the last table cannot be
+// created). The registry build of the other reference fails the same way.
 TEST_F(CacheFaults, WriteFailingPartWayKeepsTheLastCache)
 {
     open(Source::Factory);
     const auto good = cacheBytes();
-    {
-        faults::WriterHook refuse([](sqlite3* db) {
-            auto deny = [](void*, int action, const char* table, const char*, const char*, const char*) {
-                return action == SQLITE_INSERT && table && std::string(table) == "XX" ? SQLITE_DENY : SQLITE_OK;
-            };
-            sqlite3_set_authorizer(db, deny, nullptr);
-        });
-        rebuild(Source::Factory);
-    }
-    EXPECT_EQ(logged("Failed to create small DB 23\n"), 1u);
-    EXPECT_TRUE(cacheValidFor(kSecondReference, kFactorySmallVersion));
-    EXPECT_TRUE(cacheBytes() == good) << "the cache file changed";
-    EXPECT_TRUE(colourFrom(kSecondReference));
-}
-
-// SQLite's page limit stands in for a disk that fills up part-way through the
-// write: the last table cannot be created.
-TEST_F(CacheFaults, FullDiskPartWayKeepsTheLastCache)
-{
-    open(Source::Factory);
-    const auto good = cacheBytes();
     ASSERT_FALSE(good.empty());
-    {
-        faults::WriterHook full(
-            [](sqlite3* db) { sqlite3_exec(db, "PRAGMA max_page_count=3", nullptr, nullptr, nullptr); });
-        rebuild(Source::Factory);
-        EXPECT_EQ(logged("Failed to create small DB 13\n"), 1u);
-        EXPECT_TRUE(colourFrom(kSecondReference)) << "the new database, as after any factory build";
-
-        // The registry build of the other reference fails the same way; the
-        // file keeps the factory cache, colour stays on with the new database.
-        rebuild(Source::Configuration);
-        EXPECT_EQ(logged("Failed to create small DB 13\n"), 2u);
-        EXPECT_TRUE(colourFrom(kDefaultReference));
+    auto denyXX = [](void*, int action, const char* table, const char*, const char*, const char*) {
+        return action == SQLITE_INSERT && table && std::string(table) == "XX" ? SQLITE_DENY : SQLITE_OK;
+    };
+    const std::pair<std::function<void(sqlite3*)>, const char*> failures[] = {
+        {[denyXX](sqlite3* db) { sqlite3_set_authorizer(db, denyXX, nullptr); }, "Failed to create small DB 23\n"},
+        {[](sqlite3* db) { sqlite3_exec(db, "PRAGMA max_page_count=3", nullptr, nullptr, nullptr); },
+         "Failed to create small DB 13\n"},
+    };
+    for (const auto& [failure, line] : failures) {
+        SCOPED_TRACE(line);
+        {
+            faults::WriterHook hook(failure);
+            rebuild(Source::Factory);
+            EXPECT_EQ(logged(line), 1u);
+            EXPECT_TRUE(colourFrom(kSecondReference)) << "the new database, as after any factory build";
+            rebuild(Source::Configuration);
+            EXPECT_EQ(logged(line), 2u);
+            EXPECT_TRUE(colourFrom(kDefaultReference));
+        }
+        EXPECT_TRUE(cacheBytes() == good) << "the cache file changed";
+        EXPECT_TRUE(cacheValidFor(kSecondReference, kFactorySmallVersion));
+        EXPECT_FALSE(std::filesystem::exists(buildingFile()));
     }
-    EXPECT_TRUE(cacheBytes() == good) << "the cache file changed";
-    EXPECT_TRUE(cacheValidFor(kSecondReference, kFactorySmallVersion));
-    EXPECT_FALSE(std::filesystem::exists(buildingFile()));
 }
 
 // A real file system that fills up, where the test may mount one.

@@ -2,10 +2,9 @@
 // makes of their JSON forms, and each unit comes up through the real bundle
 // with its own calibration, builds its per-chip database, finds it again on
 // the next start and estimates the colour of light its model sensor sees.
+#include "PlugInColour.h"
 #include "host/Bundle.h"
 #include "host/DeviceDescription.h"
-#include "host/DriverSample.h"
-#include "host/PlugInSession.h"
 #include "host/Unit.h"
 #include "host/calib/CalibCodec.h"
 #include "spectra/CieIlluminants.h"
@@ -88,31 +87,6 @@ uint16_t u16At(CFDataRef data, CFIndex offset)
     return uint16_t(bytes[0] | bytes[1] << 8);
 }
 
-// What the plug-in makes of one light sample: its X, Y, Z, or nothing when it
-// did not colour the event.
-std::optional<spectra::Xyz> colourOf(host::PlugInSession& session, const std::vector<double>& channels, float lux)
-{
-    ALSSampleRecord record;
-    record.sampleChannelCount = uint8_t(channels.size());
-    record.sampleOrientation = 1;
-    record.integrationTime = 100;
-    record.reportInterval = 100;
-    record.gain = 65536;
-    record.lux = lux;
-    record.rawLux = lux;
-    for (size_t c = 0; c < channels.size(); ++c)
-        record.channelValues[c] = float(channels[c]);
-    IOHIDEventRef event = host::createALSEvent(record, 1000);
-    session.filter(event);
-    std::optional<spectra::Xyz> xyz;
-    if (IOHIDEventGetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace) == 1)
-        xyz = spectra::Xyz{IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent0),
-                           IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent1),
-                           IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent2)};
-    CFRelease(event);
-    return xyz;
-}
-
 // Counts of the unit's sensor under `light`, the largest about 2000.
 std::vector<double> countsUnder(const spectra::SensorModel& sensor, const spectra::Spectrum& light)
 {
@@ -185,7 +159,7 @@ TEST_P(SampleUnitBringUp, CalibratesCachesAndColours)
         // reference sources, so a unit whose stored spectra are its sensor's
         // (channel order, scale, infrared tail) finds them almost exactly.
         for (const spectra::Spectrum& light : {spectra::cieD65(), spectra::cieA()}) {
-            const auto xyz = colourOf(session, countsUnder(sensor, light), 300.0f);
+            const auto xyz = vt::plugInColour(session, countsUnder(sensor, light), 300.0);
             ASSERT_TRUE(xyz) << "the event was not coloured";
             EXPECT_NEAR(xyz->Y, 300.0, 0.01);
             EXPECT_LT(colourError(*xyz, light), 0.002);
@@ -199,7 +173,7 @@ TEST_P(SampleUnitBringUp, CalibratesCachesAndColours)
     VPDispatchDrain();
     EXPECT_TRUE(log.contains("Matching cached DB found"));
     EXPECT_FALSE(log.contains("Small DB has been created\n"));
-    EXPECT_TRUE(colourOf(session, countsUnder(sensor, spectra::cieD65()), 300.0f));
+    EXPECT_TRUE(vt::plugInColour(session, countsUnder(sensor, spectra::cieD65()), 300.0));
 }
 
 INSTANTIATE_TEST_SUITE_P(DataDevices, SampleUnitBringUp, testing::ValuesIn(sampleUnits()),

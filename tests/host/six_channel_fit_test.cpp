@@ -8,9 +8,8 @@
 // normaliser weights, which record channels the filter feeds to the fit)
 // moves the plug-in away from this estimate. Where both are far from the
 // truth (line spectra), the loss belongs to the sensor, not to the path.
+#include "PlugInColour.h"
 #include "host/Bundle.h"
-#include "host/DriverSample.h"
-#include "host/PlugInSession.h"
 #include "host/Unit.h"
 #include "host/UnitSpectra.h"
 #include "spectra/Catalogue.h"
@@ -142,24 +141,16 @@ TEST(SixChannelUnit, PlugInGivesTheFitOfItsFiveColourChannels)
     for (const spectra::Source& light : spectra::testLights()) {
         SCOPED_TRACE(light.name);
         // All six channels as the driver reports them, the strongest at 2000 counts.
-        const std::vector<double> counts = spectra::channelResponses(sensor, light.spectrum);
+        std::vector<double> counts = spectra::channelResponses(sensor, light.spectrum);
         const double scale = 2000.0 / *std::max_element(counts.begin(), counts.end());
-        ALSSampleRecord record;
-        record.sampleChannelCount = 6;
-        record.sampleOrientation = 1;
-        record.lux = 100.0f;
-        for (size_t c = 0; c < counts.size(); ++c)
-            record.channelValues[c] = float(counts[c] * scale);
-        IOHIDEventRef event = host::createALSEvent(record, 1000);
-        session.filter(event);
-        const spectra::Xyz plugIn{IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent0),
-                                  IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent1),
-                                  IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent2)};
-        CFRelease(event);
-        ASSERT_NEAR(plugIn.Y, 100.0, 0.01);
+        for (double& c : counts)
+            c *= scale;
+        const auto plugIn = vt::plugInColour(session, counts, 100.0);
+        ASSERT_TRUE(plugIn) << "the event was not coloured";
+        ASSERT_NEAR(plugIn->Y, 100.0, 0.01);
 
         const spectra::Xyz expected = fit.estimate(fit.fold(light.spectrum).fitted);
-        EXPECT_LT(distance(plugIn, expected), 1e-4);
+        EXPECT_LT(distance(*plugIn, expected), 1e-4);
     }
 }
 

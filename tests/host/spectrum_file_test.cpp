@@ -67,31 +67,34 @@ TEST(SpectrumFile, ReadsCgatsAndCsvOnAnyGrid)
 
 TEST(SpectrumFile, FilesWithoutASpectrumNameFileLineAndReason)
 {
+    struct Case {
+        const char* name;
+        const char* text; // nullptr: no such file
+        std::string error; // what follows the file's path
+        bool exact = true;
+    };
+    const Case cases[] = {
+        {"missing.csv", nullptr, ": no such file"},
+        {"empty.csv", "", ": empty file, no spectrum"},
+        {"comments.csv", "# nothing\n\n", ": no spectrum: the file has no (nm, value) rows"},
+        {"word.csv", "nm,value\n400,1\n500,bright\n700,1\n", ":3: 'bright' is not a number"},
+        {"three.csv", "400,1,2\n", ":1: expected two values (nm, value), found 3"},
+        {"down.csv", "700,1\n400,1\n", ":2: wavelengths must ascend", false},
+        // Another grid is fine, but it has to cover the visible range.
+        {"infrared.csv", "500,1\n600,1\n1000,1\n",
+         ": the spectrum covers 500–1000 nm; it must cover the visible range 400–700 nm"},
+        {"dark.csv", "380,0\n780,0\n", ": the spectrum has no light in the visible range"},
+        {"light.sp", "this is not CGATS\n", "", false},
+    };
     vt::TempDir dir;
-    const fs::path missing = dir.path() / "missing.csv";
-    EXPECT_EQ(errorOf(missing), missing.string() + ": no such file");
-
-    const fs::path empty = write(dir, "empty.csv", "");
-    EXPECT_EQ(errorOf(empty), empty.string() + ": empty file, no spectrum");
-    const fs::path comments = write(dir, "comments.csv", "# nothing\n\n");
-    EXPECT_EQ(errorOf(comments), comments.string() + ": no spectrum: the file has no (nm, value) rows");
-
-    const fs::path word = write(dir, "word.csv", "nm,value\n400,1\n500,bright\n700,1\n");
-    EXPECT_EQ(errorOf(word), word.string() + ":3: 'bright' is not a number");
-    const fs::path three = write(dir, "three.csv", "400,1,2\n");
-    EXPECT_EQ(errorOf(three), three.string() + ":1: expected two values (nm, value), found 3");
-    const fs::path descending = write(dir, "down.csv", "700,1\n400,1\n");
-    EXPECT_NE(errorOf(descending).find(descending.string() + ":2: wavelengths must ascend"), std::string::npos);
-
-    // Another grid is fine, but it has to cover the visible range.
-    const fs::path infrared = write(dir, "infrared.csv", "500,1\n600,1\n1000,1\n");
-    EXPECT_EQ(errorOf(infrared),
-              infrared.string() + ": the spectrum covers 500–1000 nm; it must cover the visible range 400–700 nm");
-    const fs::path dark = write(dir, "dark.csv", "380,0\n780,0\n");
-    EXPECT_EQ(errorOf(dark), dark.string() + ": the spectrum has no light in the visible range");
-
-    const fs::path notCgats = write(dir, "light.sp", "this is not CGATS\n");
-    EXPECT_NE(errorOf(notCgats).find(notCgats.string()), std::string::npos) << errorOf(notCgats);
+    for (const Case& c : cases) {
+        const fs::path file = c.text ? write(dir, c.name, c.text) : dir.path() / c.name;
+        const std::string expected = file.string() + c.error;
+        if (c.exact)
+            EXPECT_EQ(errorOf(file), expected);
+        else
+            EXPECT_NE(errorOf(file).find(expected), std::string::npos) << errorOf(file);
+    }
 }
 
 TEST(SpectrumFile, FoldersAreReadInNameOrderAndBadFilesSkipped)

@@ -1,8 +1,7 @@
 // A unit's channel spectra as its calibration stores them: found where the
 // plug-in looks, decoded by the codec, in the channel order the driver reports.
+#include "PlugInColour.h"
 #include "host/Bundle.h"
-#include "host/DriverSample.h"
-#include "host/PlugInSession.h"
 #include "host/SyntheticReading.h"
 #include "host/Unit.h"
 #include "host/UnitSpectra.h"
@@ -109,19 +108,8 @@ std::vector<spectra::Xy> plugInChromaticities(const host::DeviceDescription& des
 
     std::vector<spectra::Xy> out;
     for (const host::SensorReading& reading : readings) {
-        ALSSampleRecord record;
-        record.sampleChannelCount = uint8_t(reading.channels.size());
-        record.sampleOrientation = 1;
-        record.lux = float(reading.lux);
-        for (size_t c = 0; c < reading.channels.size(); ++c)
-            record.channelValues[c] = float(reading.channels[c]);
-        IOHIDEventRef event = host::createALSEvent(record, 1000);
-        session.filter(event);
-        const spectra::Xyz xyz{IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent0),
-                               IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent1),
-                               IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent2)};
-        out.push_back(spectra::chromaticity(xyz));
-        CFRelease(event);
+        const auto xyz = vt::plugInColour(session, reading.channels, reading.lux);
+        out.push_back(xyz ? spectra::chromaticity(*xyz) : spectra::Xy{0, 0});
     }
     return out;
 }
@@ -186,41 +174,36 @@ TEST(UnitSpectra, XwClChipTypesMapTheColumnsAsThePlugInFoldsThem)
 
 TEST(UnitSpectra, UnitsWithoutStoredSpectraSayWhy)
 {
-    auto messageOf = [](const host::DeviceDescription& d) {
+    auto expectWhy = [](const host::DeviceDescription& d, const std::string& why) {
         try {
             host::loadUnitSpectra(d);
+            ADD_FAILURE() << "loaded; expected an error naming " << why;
         } catch (const host::UnitSpectraError& e) {
-            return std::string(e.what());
+            EXPECT_NE(std::string(e.what()).find(why), std::string::npos) << e.what();
         }
-        return std::string("no error");
     };
     const host::DeviceDescription basic = unit("basic-rgbc");
-    std::string message = messageOf(basic);
-    EXPECT_NE(message.find(basic.file.string()), std::string::npos) << message;
-    EXPECT_NE(message.find("default calibration"), std::string::npos) << message;
+    expectWhy(basic, basic.file.string());
+    expectWhy(basic, "default calibration");
 
     host::DeviceDescription forced = unit("xwca-t2");
     forced.bootArgs = "debug=1 als_default_calibration=1";
-    EXPECT_NE(messageOf(forced).find("boot arguments"), std::string::npos) << messageOf(forced);
+    expectWhy(forced, "boot arguments");
 
-    // A store holding no class the plug-in reads.
     vt::TempDir dir;
     host::DeviceDescription empty = unit("xwca-t2");
     empty.factoryStore = dir.path();
-    EXPECT_NE(messageOf(empty).find("holds no record of class XwCA or XwCl"), std::string::npos)
-        << messageOf(empty);
-
+    expectWhy(empty, "holds no record of class XwCA or XwCl");
     // A record of a size no layout has names the file.
     std::ofstream(dir.path() / "XwCA") << "far too short";
-    message = messageOf(empty);
-    EXPECT_NE(message.find((dir.path() / "XwCA").string()), std::string::npos) << message;
+    expectWhy(empty, (dir.path() / "XwCA").string());
 
     // Registry calibration asked for, but the entry for the orientation is missing.
     host::DeviceDescription turned = unit("sysconfig-r1");
     for (auto& entry : turned.registry)
         if (entry.properties.contains("IOHIDOrientationType"))
             entry.properties["IOHIDOrientationType"] = {{"data", "07 00 00 00"}};
-    EXPECT_NE(messageOf(turned).find("no entry for orientation 7"), std::string::npos) << messageOf(turned);
+    expectWhy(turned, "no entry for orientation 7");
 }
 
 } // namespace

@@ -45,12 +45,10 @@ std::string device(const std::string& unit)
 // The command in a fresh working folder with its own state folder.
 class VantishCommand : public testing::Test {
 protected:
-    Outcome run(const std::string& arguments, const std::string& input = "")
+    Outcome run(const std::string& arguments)
     {
         std::string command = "cd " + quoted(dir_.str()) + " && " + quoted(VANTISH_COMMAND) + " --state " +
                               quoted((dir_.path() / "state").string()) + " " + arguments;
-        if (!input.empty())
-            command += " < " + quoted(input);
         command += " > out.txt 2> err.txt";
         Outcome o;
         const int raw = std::system(command.c_str());
@@ -179,106 +177,96 @@ TEST_F(VantishCommand, LightdbInfoShowsTheReferenceFileAndACache)
     const std::string reference = (fs::path(vt::bundleDir()) / "bzlight.sqlite").string();
     const Outcome o = run("lightdb info " + quoted(reference));
     ASSERT_EQ(o.status, 0) << o.err;
-    EXPECT_NE(o.out.find("Info      version 1, sources 425"), std::string::npos) << o.out;
-    EXPECT_NE(o.out.find("Sources   425"), std::string::npos) << o.out;
-    EXPECT_NE(o.out.find("Grid      401 sample columns, S0 … S400 (300–1100 nm in 2 nm steps)"), std::string::npos);
-    EXPECT_NE(o.out.find("Families  cie daylight hps led ledr lps mh mix planck tri\n"), std::string::npos) << o.out;
+    for (const char* line : {"Info      version 1, sources 425", "Sources   425",
+                             "Grid      401 sample columns, S0 … S400 (300–1100 nm in 2 nm steps)",
+                             "Families  cie daylight hps led ledr lps mh mix planck tri\n"})
+        EXPECT_NE(o.out.find(line), std::string::npos) << line << " in\n" << o.out;
 
     ASSERT_EQ(run("open " + device("xwca-t2")).status, 0);
     const Outcome cache = run("lightdb info " + quoted(path("state/Library/Brenzel/bzrgbc_1.sqlite").string()));
     ASSERT_EQ(cache.status, 0) << cache.err;
     EXPECT_NE(cache.out.find("per-chip database cache"), std::string::npos) << cache.out;
     EXPECT_NE(cache.out.find("Channels  5: CH0, CH1, CH2, CH3, CH4"), std::string::npos) << cache.out;
-
-    const fs::path text = file("notes.sqlite", "not a database at all, but long enough to be looked at...........");
-    const Outcome bad = run("lightdb info " + quoted(text.string()));
-    EXPECT_EQ(bad.status, 2);
-    EXPECT_EQ(bad.err, "vantish lightdb info: " + text.string() + ": cannot read (file is not a database)\n");
 }
 
-TEST_F(VantishCommand, BadDevicesAreNamedAndStopTheCommand)
+// Bad input is named with what and where; the command fails (1) only when
+// nothing could be done, and stops (2) on a bad device, light or report.
+TEST_F(VantishCommand, BadInputIsNamedAndOnlyNothingDoneFails)
 {
-    const fs::path missing = path("nowhere.json");
-    Outcome o = run("run " + quoted(missing.string()) + " --events -", "/dev/null");
-    EXPECT_EQ(o.status, 2);
-    EXPECT_EQ(o.err, "vantish: " + missing.string() + ": cannot open the device description\n");
-
-    const fs::path broken = file("broken.json", "{\"name\": \"x\", \"service\": {");
-    o = run("synth " + quoted(broken.string()) + " --source cie-a");
-    EXPECT_EQ(o.status, 2);
-    EXPECT_EQ(lineCount(o.err), 1) << o.err;
-    EXPECT_EQ(o.err.rfind("vantish synth: " + broken.string() + ": not valid JSON: ", 0), 0u) << o.err;
-
-    const fs::path empty = file("empty.json", "");
-    o = run("eval " + quoted(empty.string()));
-    EXPECT_EQ(o.status, 2);
-    EXPECT_EQ(o.err.rfind("vantish eval: " + empty.string() + ": not valid JSON: ", 0), 0u) << o.err;
-
-    o = run("synth " + device("basic-rgbc") + " --source cie-a");
-    EXPECT_EQ(o.status, 2);
-    EXPECT_NE(o.err.find("basic-rgbc/device.json: the unit has no factory store and no registry calibration"),
-              std::string::npos)
-        << o.err;
-    EXPECT_EQ(o.out, "");
-}
-
-TEST_F(VantishCommand, BadRowsAreSkippedAndOnlyNothingDoneFails)
-{
+    file("broken.json", "{\"name\": \"x\", \"service\": {");
+    file("empty.json", "");
     file("events.csv", "c0,c1,c2,c3,c4,lux\n900,2000,1500,4000,10,100\n900,abc,1500,4000,10,100\n"
                        "900,2000,1500,4000,10,100\n");
-    Outcome o = run("run " + device("xwca-t2") + " --events events.csv");
-    EXPECT_EQ(o.status, 0);
-    EXPECT_EQ(o.err, "vantish: events.csv:3: field 'c1': 'abc' is not a number\n");
-    EXPECT_EQ(lineCount(o.out), 1 + 2) << o.out;
-
     file("bad.csv", "c0,c1,lux\nx,1,2\n");
-    o = run("run " + device("xwca-t2") + " --events bad.csv");
-    EXPECT_EQ(o.status, 1);
-    EXPECT_EQ(o.err, "vantish: bad.csv:2: field 'c0': 'x' is not a number\n");
-
     file("nothing.csv", "");
-    o = run("run " + device("xwca-t2") + " --events nothing.csv");
-    EXPECT_EQ(o.status, 1);
-    EXPECT_EQ(o.err, "vantish: nothing.csv: no samples (the input is empty or only a header)\n");
-}
-
-TEST_F(VantishCommand, BadSpectraAreNamedAndSkipped)
-{
-    const fs::path narrow = file("narrow.csv", "nm,value\n500,1\n600,1\n1000,1\n");
-    Outcome o = run("synth " + device("xwca-t2") + " --spectrum " + quoted(narrow.string()));
-    EXPECT_EQ(o.status, 2);
-    EXPECT_EQ(o.err, "vantish synth: " + narrow.string() +
-                         ": the spectrum covers 500–1000 nm; it must cover the visible range 400–700 nm\n");
-
-    const fs::path empty = file("empty.sp", "");
-    o = run("synth " + device("xwca-t2") + " --spectrum " + quoted(empty.string()));
-    EXPECT_EQ(o.status, 2);
-    EXPECT_EQ(o.err, "vantish synth: " + empty.string() + ": empty file, no spectrum\n");
-
-    o = run("synth " + device("xwca-t2") + " --source no-such-light");
-    EXPECT_EQ(o.status, 2);
-    EXPECT_NE(o.err.find("--source no-such-light: no such light"), std::string::npos) << o.err;
-
-    // On another grid and covering 400–700 nm: used.
+    // Text that is not UTF-8 has no property value (found by fuzzing: the command aborted).
+    file("utf8.csv", "lux,c0,c1,c2,c3\n100,10,20,30,40\n!set \xFF=1\n!set RGBCOverride=\xFE\n120,10,20,30,40\n");
+    file("narrow.csv", "nm,value\n500,1\n600,1\n1000,1\n");
+    file("empty.sp", "");
     fs::create_directory(path("lights"));
-    file("lights/wide.csv", "380,0.5\n450,1.0\n550,0.8\n650,0.9\n780,0.7\n");
+    file("lights/wide.csv", "380,0.5\n450,1.0\n550,0.8\n650,0.9\n780,0.7\n"); // another grid, covers 400–700 nm
     file("lights/word.csv", "380,0.5\n450,bright\n780,0.7\n");
-    o = run("eval " + device("xwca-t2") + " --spectra lights");
-    EXPECT_EQ(o.status, 0) << o.err;
-    EXPECT_EQ(o.err, "vantish eval: lights/word.csv:2: 'bright' is not a number\n");
-    EXPECT_NE(o.out.find("\nwide "), std::string::npos) << o.out;
-    EXPECT_NE(o.out.find("over 1 lights"), std::string::npos) << o.out;
-
-    o = run("eval " + device("xwca-t2") + " --spectra lights/word.csv");
-    EXPECT_EQ(o.status, 2);
-    EXPECT_EQ(o.err, "vantish eval: lights/word.csv:2: 'bright' is not a number\nvantish eval: no light to evaluate\n");
-
-    // A report that cannot be written stops the evaluation before it starts.
     file("blocked", "a file where the report's folder should be");
-    o = run("eval " + device("xwca-t2") + " --report blocked/report.html");
-    EXPECT_EQ(o.status, 2);
-    EXPECT_EQ(o.err, "vantish eval: blocked/report.html: cannot write the report\n");
-    EXPECT_EQ(o.out, "");
+    file("notes.sqlite", "not a database at all, but long enough to be looked at...........");
+
+    enum class Match { Exact, Prefix, Contains };
+    struct Case {
+        std::string args;
+        int status;
+        std::string err;
+        Match match = Match::Exact;
+        std::vector<std::string> out = {}; // texts the output holds
+        int outLines = -1; // 0: no output at all
+    };
+    const std::string xwca = device("xwca-t2");
+    const Case cases[] = {
+        {"run nowhere.json --events - < /dev/null", 2, "vantish: nowhere.json: cannot open the device description\n"},
+        {"synth broken.json --source cie-a", 2, "vantish synth: broken.json: not valid JSON: ", Match::Prefix},
+        {"eval empty.json", 2, "vantish eval: empty.json: not valid JSON: ", Match::Prefix},
+        {"synth " + device("basic-rgbc") + " --source cie-a", 2,
+         "basic-rgbc/device.json: the unit has no factory store and no registry calibration", Match::Contains, {}, 0},
+        {"run " + xwca + " --events events.csv", 0, "vantish: events.csv:3: field 'c1': 'abc' is not a number\n",
+         Match::Exact, {}, 1 + 2},
+        {"run " + xwca + " --events bad.csv", 1, "vantish: bad.csv:2: field 'c0': 'x' is not a number\n"},
+        {"run " + xwca + " --events nothing.csv", 1,
+         "vantish: nothing.csv: no samples (the input is empty or only a header)\n"},
+        {"run " + device("basic-rgbc") + " --events utf8.csv", 0,
+         "vantish: utf8.csv:3: field '\xFF': the key is not UTF-8 text\n"
+         "vantish: utf8.csv:4: field 'RGBCOverride': property value: the text is not UTF-8\n",
+         Match::Exact, {"\n0,", "\n1,"}, 1 + 2},
+        {"synth " + xwca + " --spectrum narrow.csv", 2,
+         "vantish synth: narrow.csv: the spectrum covers 500–1000 nm; it must cover the visible range 400–700 nm\n"},
+        {"synth " + xwca + " --spectrum empty.sp", 2, "vantish synth: empty.sp: empty file, no spectrum\n"},
+        {"synth " + xwca + " --source no-such-light", 2, "--source no-such-light: no such light", Match::Contains},
+        {"eval " + xwca + " --spectra lights", 0, "vantish eval: lights/word.csv:2: 'bright' is not a number\n",
+         Match::Exact, {"\nwide ", "over 1 lights"}},
+        {"eval " + xwca + " --spectra lights/word.csv", 2,
+         "vantish eval: lights/word.csv:2: 'bright' is not a number\nvantish eval: no light to evaluate\n"},
+        // A report that cannot be written stops the evaluation before it starts.
+        {"eval " + xwca + " --report blocked/report.html", 2,
+         "vantish eval: blocked/report.html: cannot write the report\n", Match::Exact, {}, 0},
+        {"lightdb info notes.sqlite", 2, "vantish lightdb info: notes.sqlite: cannot read (file is not a database)\n"},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.args);
+        const Outcome o = run(c.args);
+        EXPECT_EQ(o.status, c.status);
+        switch (c.match) {
+        case Match::Exact: EXPECT_EQ(o.err, c.err); break;
+        case Match::Prefix:
+            EXPECT_EQ(o.err.rfind(c.err, 0), 0u) << o.err;
+            EXPECT_EQ(lineCount(o.err), 1) << o.err;
+            break;
+        case Match::Contains: EXPECT_NE(o.err.find(c.err), std::string::npos) << o.err; break;
+        }
+        for (const std::string& text : c.out)
+            EXPECT_NE(o.out.find(text), std::string::npos) << text << " in\n" << o.out;
+        if (c.outLines == 0) {
+            EXPECT_EQ(o.out, "");
+        } else if (c.outLines > 0) {
+            EXPECT_EQ(lineCount(o.out), c.outLines) << o.out;
+        }
+    }
 }
 
 TEST_F(VantishCommand, OneHelpTreeDocumentsEverySubcommand)

@@ -1,4 +1,5 @@
 #include "LightDbFiles.h"
+#include "PlugInHolder.h"
 
 #include "lightdb/LDBM.h"
 
@@ -164,4 +165,30 @@ TEST_F(BigDBTest, MissingReferenceFileCallsNothing)
     bool valid = true;
     EXPECT_EQ(LDBMInitialize(1, &out, &valid, BigDBTypeDefault, 1.1f), SQLITE_CANTOPEN);
     EXPECT_FALSE(valid);
+}
+
+// An Info claiming an absurd number of sources (found by fuzzing: 200 million
+// made the plug-in allocate and clear gigabytes before the scan could notice
+// that the rows are not there) is refused as corrupt.
+TEST_F(BigDBTest, MoreSourcesThanADatabaseCanHoldIsCorrupt)
+{
+    ldbtest::PlugInHolder plugin;
+    for (int sources : {LDBMMaxSources, LDBMMaxSources + 1, 200000000}) {
+        SCOPED_TRACE(sources);
+        std::filesystem::remove(bigDB());
+        ldbtest::writeReference(bigDB(), "1.5", sources, {{0, 1.0f, 1.0f, 1.0f, {1.0f, 2.0f}}});
+        LDBMInfo info;
+        bool valid = true;
+        const bool tooMany = sources > LDBMMaxSources;
+        EXPECT_EQ(LDBMInitialize(1, &info, &valid, BigDBTypeDefault, 1.1f), tooMany ? SQLITE_CORRUPT : 0);
+        // A refused Info leaves the caller's as it was.
+        EXPECT_EQ(info.sources, tooMany ? 0 : LDBMMaxSources);
+        if (!tooMany)
+            continue;
+        EXPECT_FALSE(valid);
+
+        SpectralDatabase db;
+        EXPECT_FALSE(plugin->processCachedDB(5, BigDBTypeDefault, db));
+        EXPECT_TRUE(db.dbXYZ.empty() && db.dbChannelResponses.empty());
+    }
 }

@@ -4,6 +4,7 @@
 #include "lightdb/LDBM.h"
 
 #include <cmath>
+#include <functional>
 
 using ldbtest::runSql;
 
@@ -102,17 +103,28 @@ TEST_F(CachedDBTest, BuildsOnceThenLoadsTheSameArrays)
     expectPrinted(loaded.dbChannelResponses, built.dbChannelResponses);
 }
 
-TEST_F(CachedDBTest, CacheOfAnotherChipIsRebuiltFromZero)
+// Nothing of a cache that is rejected stays in the database to be rebuilt.
+TEST_F(CachedDBTest, CacheOfAnotherChipOrCorruptedIsRebuiltFromZero)
 {
     SpectralDatabase db;
     loadOrBuild(db);
-    plugin->chipId = 0x5151;
-    log.clear();
-    SpectralDatabase other;
-    EXPECT_FALSE(plugin->processCachedDB(5, BigDBTypeDefault, other));
-    EXPECT_TRUE(log.contains("Found cached DB for different chip ID. Recreating"));
-    EXPECT_EQ(other.dbXYZ.size(), 9u);
-    EXPECT_TRUE(allZero(other.dbXYZ) && allZero(other.dbChannelResponses)) << "nothing of the rejected cache stays";
+    const std::pair<std::function<void()>, const char*> rejections[] = {
+        {[&] { plugin->chipId = 0x5151; }, "Found cached DB for different chip ID. Recreating"},
+        {[&] {
+             plugin->chipId = 0x5150;
+             runSql(cacheFile(1), "INSERT INTO XX VALUES (1, 2, 3);");
+         },
+         "Cached DB corrupted. Recreating"},
+    };
+    for (const auto& [reject, line] : rejections) {
+        reject();
+        log.clear();
+        SpectralDatabase again;
+        EXPECT_FALSE(plugin->processCachedDB(5, BigDBTypeDefault, again)) << line;
+        EXPECT_TRUE(log.contains(line));
+        EXPECT_EQ(again.dbXYZ.size(), 9u);
+        EXPECT_TRUE(allZero(again.dbXYZ) && allZero(again.dbChannelResponses)) << line;
+    }
 }
 
 TEST_F(CachedDBTest, ChipIdZeroCacheServesOnlyChipIdZero)
@@ -124,18 +136,6 @@ TEST_F(CachedDBTest, ChipIdZeroCacheServesOnlyChipIdZero)
     plugin->chipId = 7;
     EXPECT_FALSE(plugin->processCachedDB(4, BigDBTypeDefault, db));
     EXPECT_TRUE(log.contains("Found cached DB for different chip ID. Recreating"));
-}
-
-TEST_F(CachedDBTest, CorruptedCacheIsRebuiltFromZero)
-{
-    SpectralDatabase db;
-    loadOrBuild(db);
-    runSql(cacheFile(1), "INSERT INTO XX VALUES (1, 2, 3);");
-    log.clear();
-    SpectralDatabase again;
-    EXPECT_FALSE(plugin->processCachedDB(5, BigDBTypeDefault, again));
-    EXPECT_TRUE(log.contains("Cached DB corrupted. Recreating"));
-    EXPECT_TRUE(allZero(again.dbXYZ) && allZero(again.dbChannelResponses));
 }
 
 TEST_F(CachedDBTest, FiveChannelCacheLoadsIntoFourRowsWithoutOverrun)

@@ -164,14 +164,6 @@ TEST_F(SmallDBTest, BuildStoppedPartWayKeepsThePreviousCache)
     EXPECT_TRUE(valid(1.3f));
 }
 
-TEST_F(SmallDBTest, CacheThatIsNoDatabaseIsReplaced)
-{
-    std::filesystem::create_directories(roots_.cacheDir());
-    std::ofstream(cacheFile(1)) << "not a database";
-    ASSERT_EQ(create(), 0);
-    EXPECT_TRUE(valid(1.3f));
-}
-
 TEST_F(SmallDBTest, UnwritableCacheReturnsTwo)
 {
     // The cache folder is a regular file: nothing can be created under it.

@@ -11,6 +11,7 @@
 #include <limits>
 #include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 using vt::own;
@@ -136,37 +137,29 @@ TEST(CFEquality, ValueTypesCompareByValue)
     EXPECT_FALSE(CFEqual(e1.get(), own(CFErrorCreate(nullptr, CFSTR("QVT"), 6, nullptr)).get()));
 }
 
+// Whether the read was exact, and the value it gave.
+template <class T>
+std::pair<bool, double> readAs(const vt::Owned<CFNumberRef>& number, CFNumberType type)
+{
+    T value{};
+    const bool exact = CFNumberGetValue(number.get(), type, &value);
+    return {exact, double(value)};
+}
+
 TEST(CFNumber, ConversionsTruncateSaturateAndReportLoss)
 {
-    auto value = vt::number(-3.7);
-    int32_t i32 = 0;
-    EXPECT_FALSE(CFNumberGetValue(value.get(), kCFNumberSInt32Type, &i32));
-    EXPECT_EQ(i32, -3);
-
-    int8_t i8 = 0;
-    EXPECT_FALSE(CFNumberGetValue(vt::number(300).get(), kCFNumberSInt8Type, &i8));
-    EXPECT_EQ(i8, 127);
-    EXPECT_FALSE(CFNumberGetValue(vt::number(1e10).get(), kCFNumberIntType, &i32));
-    EXPECT_EQ(i32, std::numeric_limits<int32_t>::max());
-    int64_t i64 = 0;
-    EXPECT_FALSE(CFNumberGetValue(vt::number(-1e300).get(), kCFNumberSInt64Type, &i64));
-    EXPECT_EQ(i64, std::numeric_limits<int64_t>::min());
-    EXPECT_FALSE(CFNumberGetValue(vt::number(std::nan("")).get(), kCFNumberSInt64Type, &i64));
-    EXPECT_EQ(i64, 0);
-    EXPECT_TRUE(CFNumberGetValue(vt::number(-128.0).get(), kCFNumberSInt8Type, &i8));
-    EXPECT_EQ(i8, -128);
-
-    float f = 0;
-    EXPECT_FALSE(CFNumberGetValue(vt::number(16777217).get(), kCFNumberFloatType, &f));
-    EXPECT_FALSE(CFNumberGetValue(vt::number(0.1).get(), kCFNumberFloat32Type, &f));
-    EXPECT_FLOAT_EQ(f, 0.1f);
-    EXPECT_TRUE(CFNumberGetValue(vt::number(0.5).get(), kCFNumberFloat32Type, &f));
-    EXPECT_FALSE(CFNumberGetValue(vt::number(1e300).get(), kCFNumberFloat32Type, &f));
-    EXPECT_EQ(f, FLT_MAX);
-
-    double d = 0;
-    EXPECT_TRUE(CFNumberGetValue(vt::number(42).get(), kCFNumberDoubleType, &d));
-    EXPECT_EQ(d, 42.0);
+    using R = std::pair<bool, double>;
+    EXPECT_EQ(readAs<int32_t>(vt::number(-3.7), kCFNumberSInt32Type), R(false, -3));
+    EXPECT_EQ(readAs<int8_t>(vt::number(300), kCFNumberSInt8Type), R(false, 127));
+    EXPECT_EQ(readAs<int32_t>(vt::number(1e10), kCFNumberIntType), R(false, std::numeric_limits<int32_t>::max()));
+    EXPECT_EQ(readAs<int64_t>(vt::number(-1e300), kCFNumberSInt64Type), R(false, -0x1p63));
+    EXPECT_EQ(readAs<int64_t>(vt::number(std::nan("")), kCFNumberSInt64Type), R(false, 0));
+    EXPECT_EQ(readAs<int8_t>(vt::number(-128.0), kCFNumberSInt8Type), R(true, -128));
+    EXPECT_FALSE(readAs<float>(vt::number(16777217), kCFNumberFloatType).first);
+    EXPECT_EQ(readAs<float>(vt::number(0.1), kCFNumberFloat32Type), R(false, double(0.1f)));
+    EXPECT_EQ(readAs<float>(vt::number(0.5), kCFNumberFloat32Type), R(true, 0.5));
+    EXPECT_EQ(readAs<float>(vt::number(1e300), kCFNumberFloat32Type), R(false, FLT_MAX));
+    EXPECT_EQ(readAs<double>(vt::number(42), kCFNumberDoubleType), R(true, 42));
     EXPECT_EQ(CFNumberGetType(vt::number(42).get()), kCFNumberIntType);
     EXPECT_TRUE(CFNumberIsFloatType(vt::number(1.0).get()));
 }

@@ -4,7 +4,6 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <condition_variable>
@@ -21,34 +20,20 @@ namespace {
 
 using namespace std::chrono_literals;
 
-// Counts events; waits give up after a while so that a fault fails the test
-// instead of hanging it.
-class Counter {
-public:
-    void add()
-    {
-        std::lock_guard lock(mutex_);
-        ++count_;
-        cv_.notify_all();
-    }
-    bool waitFor(int n)
-    {
-        std::unique_lock lock(mutex_);
-        return cv_.wait_for(lock, 10s, [&] { return count_ >= n; });
-    }
-
-private:
-    std::mutex mutex_;
-    std::condition_variable cv_;
-    int count_ = 0;
-};
-
+// Records steps in the order they happen; waits give up after a while so
+// that a fault fails the test instead of hanging it.
 class Trace {
 public:
-    void add(const std::string& step)
+    void add(const std::string& step = "")
     {
         std::lock_guard lock(mutex_);
         steps_.push_back(step);
+        cv_.notify_all();
+    }
+    bool waitFor(size_t n)
+    {
+        std::unique_lock lock(mutex_);
+        return cv_.wait_for(lock, 10s, [&] { return steps_.size() >= n; });
     }
     std::vector<std::string> steps()
     {
@@ -58,6 +43,7 @@ public:
 
 private:
     std::mutex mutex_;
+    std::condition_variable cv_;
     std::vector<std::string> steps_;
 };
 
@@ -84,7 +70,7 @@ public:
     }
 
 private:
-    Counter started_, released_;
+    Trace started_, released_;
 };
 
 class DispatchTest : public ::testing::Test {
@@ -97,24 +83,12 @@ protected:
     }
 };
 
-TEST_F(DispatchTest, GlobalQueuesExistForTheFourPrioritiesOnly)
-{
-    std::vector<dispatch_queue_t> queues = {queue(DISPATCH_QUEUE_PRIORITY_HIGH), queue(DISPATCH_QUEUE_PRIORITY_DEFAULT),
-                                            queue(DISPATCH_QUEUE_PRIORITY_LOW),
-                                            queue(DISPATCH_QUEUE_PRIORITY_BACKGROUND)};
-    std::sort(queues.begin(), queues.end());
-    EXPECT_NE(queues[0], nullptr);
-    EXPECT_EQ(std::unique(queues.begin(), queues.end()), queues.end());
-    EXPECT_EQ(queue(1), nullptr);
-}
-
 TEST_F(DispatchTest, HigherPriorityFirstFifoWithin)
 {
     Trace trace;
-    Counter done;
     {
         OneFreeWorker one;
-        Counter release;
+        Trace release;
         dispatch_async(queue(DISPATCH_QUEUE_PRIORITY_HIGH), [&] { release.waitFor(1); }); // the free one
         for (auto [priority, name] : {std::pair{DISPATCH_QUEUE_PRIORITY_LOW, "low1"},
                                       {DISPATCH_QUEUE_PRIORITY_BACKGROUND, "background"},
@@ -123,21 +97,19 @@ TEST_F(DispatchTest, HigherPriorityFirstFifoWithin)
                                       {DISPATCH_QUEUE_PRIORITY_DEFAULT, "default2"},
                                       {DISPATCH_QUEUE_PRIORITY_HIGH, "high2"},
                                       {DISPATCH_QUEUE_PRIORITY_LOW, "low2"}})
-            dispatch_async(queue(priority), [&trace, &done, name] {
-                trace.add(name);
-                done.add();
-            });
+            dispatch_async(queue(priority), [&trace, name] { trace.add(name); });
         release.add();
-        ASSERT_TRUE(done.waitFor(7));
+        ASSERT_TRUE(trace.waitFor(7));
     }
     EXPECT_EQ(trace.steps(),
               (std::vector<std::string>{"high1", "high2", "default1", "default2", "low1", "low2", "background"}));
+    EXPECT_EQ(queue(1), nullptr); // the four priorities only
 }
 
 TEST_F(DispatchTest, BlocksRunConcurrently)
 {
     const int workers = int(VPDispatchWorkerCount());
-    Counter arrived;
+    Trace arrived;
     std::atomic<int> sawAll{0};
     for (int i = 0; i < workers; ++i) {
         dispatch_async(queue(DISPATCH_QUEUE_PRIORITY_HIGH), [&] {
@@ -230,8 +202,7 @@ TEST_F(DispatchTest, ManualModeHoldsWorkUntilFiredThenRunsItByDueTime)
         EXPECT_EQ(VPDispatchPendingDelayed(), 0u);
         // Let the one free worker run all four before the others are let go,
         // or a freed worker may take "five" while "one" is still running.
-        for (int i = 0; i < 5000 && trace.steps().size() < 4; ++i)
-            std::this_thread::sleep_for(std::chrono::milliseconds(1));
+        EXPECT_TRUE(trace.waitFor(4));
     }
     EXPECT_EQ(trace.steps(), (std::vector<std::string>{"zero", "now", "one", "five"}));
 }
@@ -242,7 +213,7 @@ TEST_F(DispatchTest, RealModeRunsWorkWhenDue)
     std::atomic<bool> late{false};
     dispatch_after(dispatch_time(DISPATCH_TIME_NOW, int64_t(3600 * NSEC_PER_SEC)), queue(DISPATCH_QUEUE_PRIORITY_LOW),
                    [&] { late = true; });
-    Counter done;
+    Trace done;
     std::atomic<uint64_t> ranAt{0};
     uint64_t start = mach_absolute_time();
     dispatch_after(dispatch_time(DISPATCH_TIME_NOW, int64_t(3 * NSEC_PER_MSEC)), queue(DISPATCH_QUEUE_PRIORITY_HIGH),

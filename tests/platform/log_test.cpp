@@ -34,15 +34,11 @@ std::string printed(const char* format, Args... args)
     return buffer;
 }
 
-TEST(LogFormat, PrivacyAnnotationsAreDroppedAndValuesPrinted)
+TEST(LogFormat, PrivacyAnnotationsAreDroppedAndObjectsPrintTheirDescription)
 {
     EXPECT_EQ(formatted("matched %{public}s on %{private}d", "als,ct720", 3), "matched als,ct720 on 3");
     EXPECT_EQ(formatted("%{public, private}-6s|", "ab"), "ab    |");
     EXPECT_EQ(formatted("%{public}@", CFSTR("XwCA")), "XwCA");
-}
-
-TEST(LogFormat, ObjectsPrintTheirDescription)
-{
     auto error = vt::own(CFErrorCreate(nullptr, CFSTR("QVTErrorDomain"), 42, nullptr));
     EXPECT_EQ(formatted("QVTDataCopy for key %@ failed with error %@", CFSTR("XwCM"), error.get()),
               "QVTDataCopy for key XwCM failed with error " + vt::describe(error.get()));
@@ -91,26 +87,24 @@ TEST(LogFormat, LongMessagesAreNotTruncated)
     EXPECT_EQ(formatted("%*d", 1000000000, 1).size(), 100000u);
 }
 
-TEST(LogLevels, DefaultAndErrorOnInfoAndDebugOff)
+TEST(LogLevels, EachLevelEnablesItsTypesAndThoseAbove)
 {
-    VPLogLevel previous = VPLogGetLevel();
-    VPLogSetLevel(VPLogLevel::Default);
-    EXPECT_TRUE(os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_DEFAULT));
-    EXPECT_TRUE(os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_ERROR));
-    EXPECT_TRUE(os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_FAULT));
-    EXPECT_FALSE(os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_INFO));
-    EXPECT_FALSE(os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_DEBUG));
-
-    VPLogSetLevel(VPLogLevel::Info);
-    EXPECT_TRUE(os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_INFO));
-    EXPECT_FALSE(os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_DEBUG));
-
-    VPLogSetLevel(VPLogLevel::Error);
-    EXPECT_TRUE(os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_ERROR));
-    EXPECT_FALSE(os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_DEFAULT));
-
-    VPLogSetLevel(VPLogLevel::Off);
-    EXPECT_FALSE(os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_FAULT));
+    const os_log_type_t types[] = {OS_LOG_TYPE_DEBUG, OS_LOG_TYPE_INFO, OS_LOG_TYPE_DEFAULT, OS_LOG_TYPE_ERROR,
+                                   OS_LOG_TYPE_FAULT};
+    const struct {
+        VPLogLevel level;
+        bool enabled[5]; // debug, info, default, error, fault
+    } cases[] = {{VPLogLevel::Debug, {true, true, true, true, true}},
+                 {VPLogLevel::Info, {false, true, true, true, true}},
+                 {VPLogLevel::Default, {false, false, true, true, true}},
+                 {VPLogLevel::Error, {false, false, false, true, true}},
+                 {VPLogLevel::Off, {false, false, false, false, false}}};
+    const VPLogLevel previous = VPLogGetLevel();
+    for (const auto& c : cases) {
+        VPLogSetLevel(c.level);
+        for (size_t t = 0; t < 5; ++t)
+            EXPECT_EQ(os_log_type_enabled(OS_LOG_DEFAULT, types[t]), c.enabled[t]) << int(c.level) << " " << t;
+    }
     VPLogSetLevel(previous);
 }
 
@@ -206,6 +200,19 @@ TEST(LogEcho, OneLinePerMessageOnStderr)
               "com.example.vantish:default default: Parsed big DB\n"
               "com.example.vantish:default default: two\n\n"
               "default: plain\n");
+}
+
+// Handles are kept per subsystem and category: a host that creates and
+// releases plug-in instances for as long as it runs must not grow with them
+// (fuzzing found one allocation kept per instance).
+TEST(LogHandles, SameSubsystemAndCategoryGiveTheSameHandle)
+{
+    const os_log_t first = os_log_create("org.example.reuse", "default");
+    ASSERT_NE(first, nullptr);
+    for (int i = 0; i < 1000; ++i)
+        ASSERT_EQ(os_log_create("org.example.reuse", "default"), first);
+    EXPECT_NE(os_log_create("org.example.reuse", "calibration"), first);
+    EXPECT_NE(os_log_create("org.example.other", "default"), first);
 }
 
 TEST(LogHandles, CreationCanBeMadeToFail)

@@ -8,31 +8,29 @@
 
 namespace {
 
-TEST(VectorOps, MaxvHonoursStrideAndEmptyInput)
-{
-    const float a[] = {1.0f, 50.0f, -3.0f, 70.0f, 2.5f, 90.0f};
-    float c = 0;
-    vDSP_maxv(a, 2, &c, 3);
-    EXPECT_EQ(c, 2.5f);
-    vDSP_maxv(a, 1, &c, 6);
-    EXPECT_EQ(c, 90.0f);
-    const float negative[] = {-7.0f, -2.0f, -9.0f};
-    vDSP_maxv(negative, 1, &c, 3);
-    EXPECT_EQ(c, -2.0f);
-    vDSP_maxv(a, 1, &c, 0);
-    EXPECT_EQ(c, -std::numeric_limits<float>::infinity());
-}
-
-TEST(VectorOps, MaxvOverANaNIsNaN)
+TEST(VectorOps, MaxvHonoursStrideEmptyInputAndNaN)
 {
     const float nan = std::numeric_limits<float>::quiet_NaN();
-    const float first[] = {nan, 5.0f, 200.0f};
-    const float later[] = {5.0f, 200.0f, nan};
-    float c = 0;
-    vDSP_maxv(first, 1, &c, 3);
-    EXPECT_TRUE(std::isnan(c));
-    vDSP_maxv(later, 1, &c, 3);
-    EXPECT_TRUE(std::isnan(c));
+    const float a[] = {1.0f, 50.0f, -3.0f, 70.0f, 2.5f, 90.0f};
+    const float negative[] = {-7.0f, -2.0f, -9.0f};
+    const float nanFirst[] = {nan, 5.0f, 200.0f};
+    const float nanLater[] = {5.0f, 200.0f, nan};
+    const struct {
+        const float* data;
+        vDSP_Stride stride;
+        vDSP_Length n;
+        float max;
+    } cases[] = {{a, 2, 3, 2.5f},        {a, 1, 6, 90.0f},        {negative, 1, 3, -2.0f},
+                 {a, 1, 0, -INFINITY},   {nanFirst, 1, 3, nan},   {nanLater, 1, 3, nan}};
+    for (const auto& c : cases) {
+        SCOPED_TRACE(&c - cases);
+        float result = 0;
+        vDSP_maxv(c.data, c.stride, &result, c.n);
+        if (std::isnan(c.max))
+            EXPECT_TRUE(std::isnan(result));
+        else
+            EXPECT_EQ(result, c.max);
+    }
 }
 
 TEST(VectorOps, VmulWithStridesAndInPlace)
@@ -48,20 +46,15 @@ TEST(VectorOps, VmulWithStridesAndInPlace)
     EXPECT_EQ(std::vector<float>(d, d + 3), (std::vector<float>{4, 9, 16}));
 }
 
-TEST(VectorOps, Vsqrtf)
+TEST(VectorOps, VsqrtfWritesExactlyNValues)
 {
     const float x[] = {0.0f, 4.0f, 2.25f, -1.0f};
     float y[] = {9, 9, 9, 9, 9};
     int n = 4;
     vvsqrtf(y, x, &n);
-    EXPECT_EQ(y[0], 0.0f);
-    EXPECT_EQ(y[1], 2.0f);
-    EXPECT_EQ(y[2], 1.5f);
+    EXPECT_EQ(std::vector<float>(y, y + 3), (std::vector<float>{0.0f, 2.0f, 1.5f}));
     EXPECT_TRUE(std::isnan(y[3]));
     EXPECT_EQ(y[4], 9.0f);
-    n = 0;
-    vvsqrtf(y, x, &n);
-    EXPECT_EQ(y[0], 0.0f);
 }
 
 } // namespace

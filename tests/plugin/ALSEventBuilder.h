@@ -1,7 +1,7 @@
 // Test-side ALS events: the driver's sample record written byte by byte at
 // the driver's offsets (independently of the plug-in's reader), attached as
-// the vendor-defined child of an ambient-light event; and a plug-in instance
-// made by the factory.
+// the vendor-defined child of an ambient-light event; a linear database; and a
+// plug-in instance made by the factory.
 #pragma once
 
 #include "plugin/VantishPlugIn.h"
@@ -10,33 +10,17 @@
 #include <IOKit/hid/IOHIDServiceFilterPlugIn.h>
 
 #include <array>
+#include <bit>
 #include <cstdint>
-#include <cstring>
 #include <memory>
 #include <type_traits>
 #include <vector>
 
 namespace alstest {
 
-inline void putLE(std::vector<uint8_t>& bytes, size_t offset, uint64_t value, size_t size)
-{
-    for (size_t i = 0; i < size; ++i)
-        bytes.at(offset + i) = uint8_t(value >> (8 * i));
-}
-
-inline uint32_t floatBits(float f)
-{
-    uint32_t u;
-    std::memcpy(&u, &f, 4);
-    return u;
-}
-
 inline float floatAt(const uint8_t* p)
 {
-    const uint32_t u = uint32_t(p[0]) | uint32_t(p[1]) << 8 | uint32_t(p[2]) << 16 | uint32_t(p[3]) << 24;
-    float f;
-    std::memcpy(&f, &u, 4);
-    return f;
+    return std::bit_cast<float>(uint32_t(p[0]) | uint32_t(p[1]) << 8 | uint32_t(p[2]) << 16 | uint32_t(p[3]) << 24);
 }
 
 // The driver's 137-byte sample record (or a record of another length).
@@ -53,12 +37,7 @@ public:
     Record& gain(int32_t v) { return put(16, uint32_t(v), 4); }
     Record& lux(float v) { return putFloat(20, v); }
     Record& rawLux(float v) { return putFloat(24, v); }
-    Record& channels(std::array<float, 6> c)
-    {
-        for (size_t i = 0; i < 6; ++i)
-            putFloat(28 + 4 * i, c[i]);
-        return *this;
-    }
+    Record& channels(std::array<float, 6> c) { return putFloats(28, c); }
     Record& cct(float v) { return putFloat(52, v); }
     Record& timestamp(uint32_t v) { return put(72, v, 4); }
     Record& subsamples(uint16_t v) { return put(80, v, 2); }
@@ -70,18 +49,8 @@ public:
         return *this;
     }
     Record& xyzInRecord(uint8_t v) { return put(107, v, 1); }
-    Record& xyzResult(std::array<float, 3> xyz)
-    {
-        for (size_t i = 0; i < 3; ++i)
-            putFloat(108 + 4 * i, xyz[i]);
-        return *this;
-    }
-    Record& xyzSensor(std::array<float, 3> xyz)
-    {
-        for (size_t i = 0; i < 3; ++i)
-            putFloat(120 + 4 * i, xyz[i]);
-        return *this;
-    }
+    Record& xyzResult(std::array<float, 3> xyz) { return putFloats(108, xyz); }
+    Record& xyzSensor(std::array<float, 3> xyz) { return putFloats(120, xyz); }
     Record& filteredLux(float v) { return putFloat(132, v); }
     Record& filteredLuxValid(uint8_t v) { return put(136, v, 1); }
     // Bytes past the driver's fields (in a longer record).
@@ -95,13 +64,21 @@ public:
     const std::vector<uint8_t>& bytes() const { return bytes_; }
 
 private:
+    // Little-endian; a field past the end of a shorter record is left out.
     Record& put(size_t offset, uint64_t v, size_t size)
     {
-        if (offset + size <= bytes_.size())
-            putLE(bytes_, offset, v, size);
+        for (size_t i = 0; i < size && offset + size <= bytes_.size(); ++i)
+            bytes_[offset + i] = uint8_t(v >> (8 * i));
         return *this;
     }
-    Record& putFloat(size_t offset, float v) { return put(offset, floatBits(v), 4); }
+    Record& putFloat(size_t offset, float v) { return put(offset, std::bit_cast<uint32_t>(v), 4); }
+    template <size_t n>
+    Record& putFloats(size_t offset, const std::array<float, n>& values)
+    {
+        for (size_t i = 0; i < n; ++i)
+            putFloat(offset + 4 * i, values[i]);
+        return *this;
+    }
 
     std::vector<uint8_t> bytes_;
 };
@@ -134,20 +111,18 @@ inline std::vector<uint8_t> recordOf(IOHIDEventRef event)
     return {data, data + length};
 }
 
-inline std::array<float, 3> xyzResultOf(IOHIDEventRef event)
+template <size_t n>
+std::array<float, n> floatsOf(IOHIDEventRef event, size_t offset)
 {
     const auto bytes = recordOf(event);
-    return {floatAt(&bytes[108]), floatAt(&bytes[112]), floatAt(&bytes[116])};
+    std::array<float, n> out{};
+    for (size_t i = 0; i < n; ++i)
+        out[i] = floatAt(&bytes[offset + 4 * i]);
+    return out;
 }
 
-inline std::array<float, 6> channelsOf(IOHIDEventRef event)
-{
-    const auto bytes = recordOf(event);
-    std::array<float, 6> c{};
-    for (size_t i = 0; i < 6; ++i)
-        c[i] = floatAt(&bytes[28 + 4 * i]);
-    return c;
-}
+inline std::array<float, 3> xyzResultOf(IOHIDEventRef event) { return floatsOf<3>(event, 108); }
+inline std::array<float, 6> channelsOf(IOHIDEventRef event) { return floatsOf<6>(event, 28); }
 
 inline std::array<double, 3> eventXYZ(IOHIDEventRef event)
 {
@@ -159,6 +134,41 @@ inline std::array<double, 3> eventXYZ(IOHIDEventRef event)
 inline CFIndex colourSpaceOf(IOHIDEventRef event)
 {
     return IOHIDEventGetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace);
+}
+
+inline void setLastXYZ(VantishPlugIn& plugin, float x, float y, float z)
+{
+    plugin.lastXYZ[0] = x;
+    plugin.lastXYZ[1] = y;
+    plugin.lastXYZ[2] = z;
+}
+
+inline void overrideChromaticity(VantishPlugIn& plugin, double x, double y, double luminance)
+{
+    plugin.chromaticityOverrideActive = 1;
+    plugin.overrideX = x;
+    plugin.overrideY = y;
+    plugin.overrideLuminance = luminance;
+}
+
+// An exactly linear database (X = ch0, Y = ch1 + ch2, Z = ch3 + ch4), so the
+// colour written back shows which channel values reached the calculation.
+inline SpectralDatabasePtr linearDatabase(uint32_t channels)
+{
+    auto db = std::make_shared<SpectralDatabase>();
+    const uint32_t n = 12;
+    db->allocate(n, channels);
+    for (uint32_t i = 0; i < n; ++i) {
+        float sum[3] = {};
+        for (uint32_t j = 0; j < channels; ++j) {
+            const float r = float(1 + (i * (j + 2) + 3 * j) % 7);
+            db->dbChannelResponses[j * n + i] = r;
+            sum[j == 0 ? 0 : j <= 2 ? 1 : 2] += r;
+        }
+        for (uint32_t c = 0; c < 3; ++c)
+            db->dbXYZ[c * n + i] = sum[c];
+    }
+    return db;
 }
 
 inline std::array<float, 3> lastXYZOf(const VantishPlugIn& plugin)

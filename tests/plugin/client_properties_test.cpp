@@ -63,7 +63,7 @@ TEST_F(ClientProperties, RGBCOverrideOffAndOnKeepsTheValues)
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{10, 20, 30, 40, 0, 0}));
 }
 
-TEST_F(ClientProperties, RGBCArraysOfTheWrongLengthAreIgnored)
+TEST_F(ClientProperties, RGBCArraysTakeOnlyNumbersAndTheDatabasesChannelCount)
 {
     vt::LogCapture log;
     plugin_->dbChannelCount = 5;
@@ -72,22 +72,16 @@ TEST_F(ClientProperties, RGBCArraysOfTheWrongLengthAreIgnored)
     EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 0);
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{}));
     EXPECT_TRUE(log.lines().empty());
-}
 
-TEST_F(ClientProperties, RGBCElementsThatAreNotNumbersKeepTheirValues)
-{
+    plugin_->dbChannelCount = 4;
     set("RGBCOverride", array({integer(1), integer(2), integer(3), integer(4)}));
     set("RGBCOverride", array({integer(11), string("x"), CFRetain(kCFBooleanTrue), integer(44)}));
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{11, 2, 3, 44, 0, 0}));
-}
 
-TEST_F(ClientProperties, RGBCNeverStoresPastSixValues)
-{
-    vt::LogCapture log;
+    // Never stored past six values.
     plugin_->dbChannelCount = 8;
     set("RGBCOverride", array({integer(1), integer(2), integer(3), integer(4), integer(5), integer(6), integer(7),
                                integer(8)}));
-    EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 1);
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{1, 2, 3, 4, 5, 6}));
     EXPECT_TRUE(log.contains("Override ch[5]: 6"));
     EXPECT_FALSE(log.contains("Override ch[6]: 7"));
@@ -130,29 +124,22 @@ TEST_F(ClientProperties, ChromaticityIgnoresShortArraysAndNonNumbers)
     EXPECT_DOUBLE_EQ(plugin_->overrideLuminance.load(), 7.0);
 }
 
-TEST_F(ClientProperties, LambdaLeavesLambdaConfigured)
+TEST_F(ClientProperties, TuningValuesAndUnknownKeys)
 {
     vt::LogCapture log;
     set("ColorAlgoLambda", number(0.05));
     EXPECT_FLOAT_EQ(plugin_->lambda.load(), 0.05f);
-    EXPECT_EQ(plugin_->lambdaConfigured.load(), 0);
+    EXPECT_EQ(plugin_->lambdaConfigured.load(), 0); // a client lambda does not switch on normalisation
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Setting lambda 0.050000."));
     set("ColorAlgoLambda", string("0.5"));
     EXPECT_FLOAT_EQ(plugin_->lambda.load(), 0.05f);
-}
 
-TEST_F(ClientProperties, MitigationTypeWithoutChannelRatioMitigation)
-{
-    vt::LogCapture log;
     set("ChannelRatioMitigationType", integer(3));
     EXPECT_EQ(plugin_->mitigationType.load(), 3u);
     EXPECT_EQ(plugin_->channelRatioMitigation.load(), 0);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Setting channel ratio mitigation type 3."));
-}
 
-TEST_F(ClientProperties, UnknownKeysAreIgnored)
-{
-    vt::LogCapture log;
+    log.clear();
     set("SomethingElse", integer(1));
     plugin_->setPropertyForClient(nullptr, kCFBooleanTrue, nullptr);
     EXPECT_TRUE(log.lines().empty());
@@ -160,47 +147,43 @@ TEST_F(ClientProperties, UnknownKeysAreIgnored)
 
 // ---- Rebuild -------------------------------------------------------------------------------
 
-TEST_F(ClientProperties, RebuildFromRegistryCalibrationRunsOnTheCallersThread)
+TEST_F(ClientProperties, RebuildRunsOnTheCallersThread)
 {
-    vt::LogCapture log;
-    VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), kCFBooleanTrue);
-    publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    set("RebuildVelderDB", integer(1));
-    // Done before the call returned: nothing was queued for the cache.
-    EXPECT_TRUE(std::filesystem::exists(cacheFile()));
-    EXPECT_TRUE(plugin_->isDbReady());
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Rebuild databases."));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Use sysconfig calibration to calibrate sensor\n"));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Databases were rebuilt successfully."));
-    EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u); // no push on rebuild
-}
-
-TEST_F(ClientProperties, RebuildForASpectrumToProcess)
-{
-    vt::LogCapture log;
-    VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), kCFBooleanFalse);
-    VPServicePublishProperty(service_, CFSTR("ALSCalibrationSpectrumToProcess"), kCFBooleanTrue);
-    publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    set("RebuildVelderDB", nullptr);
-    EXPECT_TRUE(log.contains("Don't use sysconfig calibration to calibrate sensor\n"));
-    EXPECT_TRUE(log.contains("Databases were rebuilt successfully."));
-    EXPECT_TRUE(plugin_->isDbReady());
+    struct Case {
+        CFBooleanRef sysConfig, spectrumToProcess;
+        const char* line;
+        bool withValue; // any value, or none, asks for the rebuild
+    };
+    for (const Case& c :
+         {Case{kCFBooleanTrue, nullptr, "Use sysconfig calibration to calibrate sensor\n", true},
+          Case{kCFBooleanFalse, kCFBooleanTrue, "Don't use sysconfig calibration to calibrate sensor\n", false}}) {
+        SCOPED_TRACE(c.line);
+        std::filesystem::remove(cacheFile());
+        plugin_->setDbReady(false);
+        vt::LogCapture log;
+        VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), c.sysConfig);
+        VPServicePublishProperty(service_, CFSTR("ALSCalibrationSpectrumToProcess"), c.spectrumToProcess);
+        publish("alsCalibration", blob({GenericEntry{}.bytes()}));
+        set("RebuildVelderDB", c.withValue ? integer(1) : nullptr);
+        // Done before the call returned: nothing was queued for the cache.
+        EXPECT_TRUE(std::filesystem::exists(cacheFile()));
+        EXPECT_TRUE(plugin_->isDbReady());
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Rebuild databases."));
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, c.line));
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Databases were rebuilt successfully."));
+        EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u); // no push on rebuild
+    }
 }
 
 TEST_F(ClientProperties, FailedRebuilds)
 {
     vt::TempDir emptyStore;
     VPQVTSetStoreDirectory(emptyStore.str());
-    {
+    // Configuration calibration without a blob, then neither property: the
+    // factory store, which has nothing.
+    for (CFBooleanRef sysConfig : {kCFBooleanTrue, CFBooleanRef(nullptr)}) {
         vt::LogCapture log;
-        VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), kCFBooleanTrue); // but no blob
-        set("RebuildVelderDB", integer(1));
-        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to rebuild databases."));
-    }
-    {
-        // Neither property: the factory store, which has nothing.
-        vt::LogCapture log;
-        VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), nullptr);
+        VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), sysConfig);
         set("RebuildVelderDB", integer(1));
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to rebuild databases."));
         EXPECT_FALSE(log.contains("Databases were rebuilt successfully."));

@@ -17,16 +17,7 @@ protected:
     {
         plugin->numberOfChannels = 4;
         plugin->dbChannelCount = 4;
-        plugin->lastXYZ[0] = 1.0f;
-        plugin->lastXYZ[1] = 2.0f;
-        plugin->lastXYZ[2] = 3.0f;
-    }
-    void overrideChromaticity(double x, double y, double luminance)
-    {
-        plugin->chromaticityOverrideActive = 1;
-        plugin->overrideX = x;
-        plugin->overrideY = y;
-        plugin->overrideLuminance = luminance;
+        setLastXYZ(*plugin, 1, 2, 3);
     }
     size_t linesContaining(const std::string& part)
     {
@@ -67,7 +58,7 @@ TEST_F(CopyEvent, AColourAlreadyThereIsKept)
 TEST_F(CopyEvent, ChromaticityOverrideAppliesToCopies)
 {
     plugin->setDbReady(true);
-    overrideChromaticity(0.3127, 0.3290, 100.0);
+    overrideChromaticity(*plugin, 0.3127, 0.3290, 100.0);
     auto event = createALSEvent(nullptr);
     plugin->filterCopyEvent(event.get());
     const auto xyz = eventXYZ(event.get());
@@ -82,7 +73,7 @@ TEST_F(CopyEvent, ChromaticityOverrideAppliesToCopies)
     EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{1.0f, 2.0f, 3.0f}));
 
     // A y of 0 leaves the override out.
-    overrideChromaticity(0.3127, 0.0, 100.0);
+    overrideChromaticity(*plugin, 0.3127, 0.0, 100.0);
     auto plain = createALSEvent(nullptr);
     plugin->filterCopyEvent(plain.get());
     EXPECT_EQ(eventXYZ(plain.get()), (std::array<double, 3>{1.0, 2.0, 3.0}));
@@ -90,7 +81,7 @@ TEST_F(CopyEvent, ChromaticityOverrideAppliesToCopies)
 
 TEST_F(CopyEvent, NothingChangesWithoutADatabaseOrForOtherEvents)
 {
-    overrideChromaticity(0.3127, 0.3290, 100.0);
+    overrideChromaticity(*plugin, 0.3127, 0.3290, 100.0);
     auto event = createALSEvent(nullptr);
     plugin->filterCopyEvent(event.get());
     EXPECT_EQ(colourSpaceOf(event.get()), 0);
@@ -109,17 +100,7 @@ TEST_F(CopyEvent, NothingChangesWithoutADatabaseOrForOtherEvents)
 
 TEST_F(CopyEvent, VD6287CopiesGoThroughTheWholeFilter)
 {
-    // A small database for four channels, published ready.
-    auto db = std::make_shared<SpectralDatabase>();
-    db->allocate(6, 4);
-    for (uint32_t i = 0; i < 6; ++i) {
-        for (uint32_t c = 0; c < 4; ++c)
-            db->dbChannelResponses[c * 6 + i] = float(10 + (i + 1) * (c + 1) + (i * c) % 3);
-        db->dbXYZ[i] = float(10 + i);
-        db->dbXYZ[i + 6] = float(12 + i);
-        db->dbXYZ[i + 12] = float(9 + 2 * i);
-    }
-    plugin->publishDatabase(db, true);
+    plugin->publishDatabase(linearDatabase(4), true);
     plugin->sensorType = eALSSensorTypeVD6287;
 
     Record record;

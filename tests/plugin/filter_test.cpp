@@ -1,6 +1,5 @@
-// The event filter on events built as the driver sends them. The database
-// used here is exactly linear (X = ch0, Y = ch1 + ch2, Z = ch3 + ch4), so the
-// colour written back shows which channel values reached the calculation.
+// The event filter on events built as the driver sends them, against the
+// linear database.
 #include "ALSEventBuilder.h"
 
 #include "support/TestSupport.h"
@@ -8,29 +7,12 @@
 #include <gtest/gtest.h>
 
 #include <cstdio>
+#include <functional>
 #include <string>
 
 using namespace alstest;
 
 namespace {
-
-SpectralDatabasePtr linearDatabase(uint32_t channels)
-{
-    auto db = std::make_shared<SpectralDatabase>();
-    const uint32_t n = 12;
-    db->allocate(n, channels);
-    for (uint32_t i = 0; i < n; ++i) {
-        float sum[3] = {};
-        for (uint32_t j = 0; j < channels; ++j) {
-            const float r = float(1 + (i * (j + 2) + 3 * j) % 7);
-            db->dbChannelResponses[j * n + i] = r;
-            sum[j == 0 ? 0 : j <= 2 ? 1 : 2] += r;
-        }
-        for (uint32_t c = 0; c < 3; ++c)
-            db->dbXYZ[c * n + i] = sum[c];
-    }
-    return db;
-}
 
 std::string format(const char* fmt, auto... args)
 {
@@ -72,21 +54,6 @@ protected:
         return event;
     }
 
-    void setLastXYZ(float x, float y, float z)
-    {
-        plugin->lastXYZ[0] = x;
-        plugin->lastXYZ[1] = y;
-        plugin->lastXYZ[2] = z;
-    }
-
-    void setChromaticityOverride(double x, double y, double luminance)
-    {
-        plugin->chromaticityOverrideActive = 1;
-        plugin->overrideX = x;
-        plugin->overrideY = y;
-        plugin->overrideLuminance = luminance;
-    }
-
     PlugIn plugin;
 };
 
@@ -101,8 +68,8 @@ Record fourChannels(std::array<float, 6> c, float lux)
 
 TEST_F(Filter, ChromaticityOverrideWritesLevelIlluminanceAndColourWithOrWithoutDatabase)
 {
-    setChromaticityOverride(0.3127, 0.3290, 100.0);
-    setLastXYZ(1, 2, 3);
+    overrideChromaticity(*plugin, 0.3127, 0.3290, 100.0);
+    setLastXYZ(*plugin, 1, 2, 3);
     for (bool ready : {false, true}) {
         plugin->setDbReady(ready);
         Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, 500));
@@ -116,7 +83,7 @@ TEST_F(Filter, ChromaticityOverrideWritesLevelIlluminanceAndColourWithOrWithoutD
 
 TEST_F(Filter, ChromaticityOverrideWithoutLuminanceUsesTheEventsIlluminance)
 {
-    setChromaticityOverride(0.3127, 0.3290, -1.0);
+    overrideChromaticity(*plugin, 0.3127, 0.3290, -1.0);
     Event event = createALSEvent(nullptr);
     IOHIDEventSetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel, 7.0);
     IOHIDEventSetDoubleValue(event.get(), kIOHIDEventFieldAmbientLightSensorIlluminance, 250.0);
@@ -126,20 +93,13 @@ TEST_F(Filter, ChromaticityOverrideWithoutLuminanceUsesTheEventsIlluminance)
     EXPECT_EQ(colourSpaceOf(event.get()), 1);
 }
 
-TEST_F(Filter, ChromaticityOverrideWithYZeroIsIgnored)
-{
-    setChromaticityOverride(0.3127, 0.0, 100.0);
-    Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, 100));
-    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 20.0, 100.0, 80.0); // (10, 50, 40) scaled to 100 lux
-}
-
 // ---- Spikes -----------------------------------------------------------------------------------
 
-TEST_F(Filter, SpikeZeroesLevelAndColourAndLogs)
+TEST_F(Filter, SpikeBelowTheLuxLimitZeroesLevelAndColourAndLogs)
 {
     plugin->channelRatioMitigation = 1;
     plugin->mitigationType = 3;
-    setLastXYZ(1, 2, 3);
+    setLastXYZ(*plugin, 1, 2, 3);
     vt::LogCapture log;
 
     Record record = fourChannels({0, 10, 10, 10, 10, 0}, 5);
@@ -153,14 +113,10 @@ TEST_F(Filter, SpikeZeroesLevelAndColourAndLogs)
     EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{0, 0, 0}));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "ALS spike detected (type = 3). Lux = 5.000000, Channel ratio = 1.000000"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "ALS spike is detected -> setting zero lux and zero color."));
-}
 
-TEST_F(Filter, NoSpikeAtTheLowLuxLimit)
-{
-    plugin->channelRatioMitigation = 1;
-    plugin->mitigationType = 3;
-    Event event = filter(fourChannels({0, 10, 10, 10, 10, 0}, 10));
-    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 0.0, 10.0, 5.0); // (0, 20, 10) scaled to 10 lux
+    // At the low-lux limit the same channels are no spike: (0, 20, 10) scaled to 10 lux.
+    event = filter(fourChannels({0, 10, 10, 10, 10, 0}, 10));
+    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 0.0, 10.0, 5.0);
     EXPECT_XYZ_NEAR(lastXYZOf(*plugin), 0.0, 10.0, 5.0);
 }
 
@@ -178,29 +134,35 @@ TEST_F(Filter, SpikeTestsSeeRawNegativeChannels)
 
 // ---- Colour input -------------------------------------------------------------------------------
 
-TEST_F(Filter, NegativeChannelsReachTheColourAsZeroAndStayInTheRecord)
+TEST_F(Filter, ChannelsReachingTheColour)
 {
-    Event event = filter(fourChannels({10, -5, 20, 30, 0, 0}, 100));
-    // (10, 0 + 20, 30) scaled to 100 lux; unclamped it would be (5, 15, 30).
-    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 50.0, 100.0, 150.0);
-    EXPECT_EQ(colourSpaceOf(event.get()), 1);
-    EXPECT_XYZ_NEAR(lastXYZOf(*plugin), 50.0, 100.0, 150.0);
-    EXPECT_EQ(channelsOf(event.get())[1], -5.0f);
-}
-
-TEST_F(Filter, ChannelMappingFollowsThePublishedDatabase)
-{
-    plugin->dbChannelCount = 5; // stale: the database in use has four channels
-    Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, 100));
-    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 20.0, 100.0, 80.0);
-}
-
-TEST_F(Filter, SixChannelSensorFeedsItsLastChannels)
-{
-    useSixChannelSensor();
-    Event event = filter(Record().sampleChannelCount(6).channels({1000, 10, 20, 30, 40, 50}).lux(100));
-    // (10, 20 + 30, 40 + 50) scaled to 100 lux.
-    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 20.0, 100.0, 180.0);
+    struct Case {
+        const char* what;
+        std::function<void()> setUp;
+        Record record;
+        std::array<double, 3> xyz;
+    };
+    const Case cases[] = {
+        // (10, 0 + 20, 30) scaled to 100 lux; unclamped it would be (5, 15, 30).
+        {"negative channels count as zero", [] {}, fourChannels({10, -5, 20, 30, 0, 0}, 100), {50, 100, 150}},
+        {"stale database channel count", [this] { plugin->dbChannelCount = 5; },
+         fourChannels({10, 20, 30, 40, 0, 0}, 100), {20, 100, 80}},
+        {"chromaticity override with y = 0 is ignored", [this] { overrideChromaticity(*plugin, 0.3127, 0.0, 100.0); },
+         fourChannels({10, 20, 30, 40, 0, 0}, 100), {20, 100, 80}},
+        // (10, 20 + 30, 40 + 50) scaled to 100 lux.
+        {"six-channel sensor feeds its last channels", [this] { useSixChannelSensor(); },
+         Record().sampleChannelCount(6).channels({1000, 10, 20, 30, 40, 50}).lux(100), {20, 100, 180}},
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.what);
+        c.setUp();
+        Event event = filter(c.record);
+        EXPECT_XYZ_NEAR(eventXYZ(event.get()), c.xyz[0], c.xyz[1], c.xyz[2]);
+        EXPECT_EQ(colourSpaceOf(event.get()), 1);
+        EXPECT_XYZ_NEAR(lastXYZOf(*plugin), c.xyz[0], c.xyz[1], c.xyz[2]);
+        // The record keeps the channels as the driver sent them.
+        EXPECT_EQ(recordOf(event.get()), c.record.bytes());
+    }
 }
 
 TEST_F(Filter, ZeroColourWhenTheFitGivesNoLuminance)
@@ -208,7 +170,7 @@ TEST_F(Filter, ZeroColourWhenTheFitGivesNoLuminance)
     Record record = fourChannels({0, 0, 0, 0, 0, 0}, 100);
     Event event = createALSEvent(&record);
     IOHIDEventSetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel, 33.0);
-    setLastXYZ(1, 2, 3);
+    setLastXYZ(*plugin, 1, 2, 3);
     plugin->filter(event.get(), false);
     EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{0, 0, 0}));
     EXPECT_EQ(colourSpaceOf(event.get()), 1);
@@ -241,32 +203,33 @@ TEST_F(Filter, SampleDetailsAreLoggedExceptForSensorType8)
 
 TEST_F(Filter, RGBCOverrideReplacesChannelsInColourRecordAndRawFields)
 {
+    struct Case {
+        bool sixChannels;
+        Record record;
+        std::array<float, 6> recorded; // the override and the clamped rest
+        std::array<double, 3> xyz;
+    };
+    const Case cases[] = {
+        // (100, 500, 400) scaled to 50 lux.
+        {false, fourChannels({1, 2, -3, 4, -5, 6}, 50), {100, 200, 300, 400, 0, 6}, {10, 50, 40}},
+        // Six channels: the override lands after the skipped channel; (100, 200 + 300, 400 + 500) at 50 lux.
+        {true, Record().sampleChannelCount(6).channels({-7, 1, 2, 3, 4, 5}).lux(50), {0, 100, 200, 300, 400, 500},
+         {10, 50, 90}},
+    };
     plugin->rgbcOverrideActive = 1;
     for (uint32_t i = 0; i < 6; ++i)
         plugin->rgbcOverride[i] = 100 * (i + 1);
-    Event event = filter(fourChannels({1, 2, -3, 4, -5, 6}, 50));
-
-    // The record shows the override and the clamped rest.
-    EXPECT_EQ(channelsOf(event.get()), (std::array<float, 6>{100, 200, 300, 400, 0, 6}));
-    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel0), 100.0);
-    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel1), 200.0);
-    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel2), 300.0);
-    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel3), 400.0);
-    // (100, 500, 400) scaled to 50 lux.
-    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 10.0, 50.0, 40.0);
-}
-
-TEST_F(Filter, RGBCOverrideOnSixChannelsLandsAfterTheSkippedChannel)
-{
-    useSixChannelSensor();
-    plugin->rgbcOverrideActive = 1;
-    for (uint32_t i = 0; i < 6; ++i)
-        plugin->rgbcOverride[i] = 100 * (i + 1);
-    Event event = filter(Record().sampleChannelCount(6).channels({-7, 1, 2, 3, 4, 5}).lux(50));
-    EXPECT_EQ(channelsOf(event.get()), (std::array<float, 6>{0, 100, 200, 300, 400, 500}));
-    EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel3), 400.0);
-    // (100, 200 + 300, 400 + 500) scaled to 50 lux.
-    EXPECT_XYZ_NEAR(eventXYZ(event.get()), 10.0, 50.0, 90.0);
+    for (const Case& c : cases) {
+        SCOPED_TRACE(c.sixChannels);
+        if (c.sixChannels)
+            useSixChannelSensor();
+        Event event = filter(c.record);
+        EXPECT_EQ(channelsOf(event.get()), c.recorded);
+        for (int i = 0; i < 4; ++i)
+            EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorRawChannel0 + i),
+                      100.0 * (i + 1));
+        EXPECT_XYZ_NEAR(eventXYZ(event.get()), c.xyz[0], c.xyz[1], c.xyz[2]);
+    }
 }
 
 // ---- Colour into the record ---------------------------------------------------------------------
@@ -310,7 +273,7 @@ TEST_F(Filter, UnknownSensorChannelCountGivesZeroColourEveryTime)
 {
     for (uint32_t channels : {3u, 7u}) {
         plugin->numberOfChannels = channels;
-        setLastXYZ(1, 2, 3);
+        setLastXYZ(*plugin, 1, 2, 3);
         vt::LogCapture log;
         Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, 100));
         EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{0, 0, 0}));
@@ -331,7 +294,7 @@ TEST_F(Filter, DatabaseWithMoreChannelsThanTheSensorGivesZeroColour)
         plugin->numberOfChannels = sensorChannels;
         plugin->publishDatabase(linearDatabase(dbChannels), true);
         plugin->rgbcOverrideActive = 1;
-        setLastXYZ(1, 2, 3);
+        setLastXYZ(*plugin, 1, 2, 3);
         vt::LogCapture log;
         Event event = filter(Record().sampleChannelCount(uint8_t(sensorChannels)).channels({1, 2, 3, 4, 5, 6}).lux(9));
         EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{0, 0, 0}));
@@ -349,7 +312,7 @@ TEST_F(Filter, DatabaseWithMoreChannelsThanTheSensorGivesZeroColour)
 
 TEST_F(Filter, EventsWithoutRecordOrDatabasePassUnchanged)
 {
-    setLastXYZ(1, 2, 3);
+    setLastXYZ(*plugin, 1, 2, 3);
     Event bare = createALSEvent(nullptr);
     plugin->filter(bare.get(), false);
     EXPECT_EQ(colourSpaceOf(bare.get()), 0);
@@ -369,7 +332,7 @@ TEST_F(Filter, EventsWithoutRecordOrDatabasePassUnchanged)
 
 TEST_F(Filter, ShortRecordPassesUnchangedAndIsLoggedSparingly)
 {
-    setLastXYZ(1, 2, 3);
+    setLastXYZ(*plugin, 1, 2, 3);
     vt::LogCapture log(VPLogLevel::Error);
     const Record truncated = Record(136).sampleChannelCount(4).channels({10, 20, 30, 40, 0, 0}).lux(100);
     Event event = filter(truncated);

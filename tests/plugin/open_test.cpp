@@ -49,11 +49,11 @@ protected:
         VPSetBootArgs(std::nullopt);
         VPRegistryReset();
     }
-    // Publishes a property, taking ownership of the value.
-    void publishOwned(const char* key, CFTypeRef value)
+    // Publishes a property (on the fixture's service unless told), taking ownership of the value.
+    void publishOwned(const char* key, CFTypeRef value, IOHIDServiceRef on = nullptr)
     {
         CFStringRef k = static_cast<CFStringRef>(string(key));
-        VPServicePublishProperty(service, k, value);
+        VPServicePublishProperty(on ? on : service, k, value);
         CFRelease(k);
         CFRelease(value);
     }
@@ -106,14 +106,10 @@ TEST_F(Match, NonConformingServiceIsDeclinedSilently)
 {
     IOHIDServiceRef other = VPServiceCreate(0x102);
     VPServiceAddUsage(other, 0xFF00, 0x0005);
-    CFStringRef key = static_cast<CFStringRef>(string("IONameMatch"));
-    CFTypeRef name = string("als,ct709");
-    VPServicePublishProperty(other, key, name);
+    publishOwned("IONameMatch", string("als,ct709"), other);
     vt::LogCapture log;
     EXPECT_EQ(plugin->match(other, 0), 0);
     EXPECT_TRUE(log.lines().empty());
-    CFRelease(name);
-    CFRelease(key);
     CFRelease(other);
 }
 
@@ -212,33 +208,26 @@ TEST_F(Open, RegistryHandleIsReleasedWithTheInstance)
     EXPECT_EQ(VPRegistryOutstandingReferences(entry), 0);
 }
 
-TEST_F(Open, QueuesFactoryBringUpByDefault)
+TEST_F(Open, CalibrationPropertiesChooseTheBringUp)
 {
-    vt::LogCapture log(VPLogLevel::Info);
-    plugin->open(service, 0);
-    VPDispatchDrain();
-    EXPECT_EQ(log.count("Getting QVT calibration...\n"), 1u);
-}
-
-TEST_F(Open, ConfigurationCalibrationReplacesBringUp)
-{
-    publishOwned("SysConfigCalibration", CFRetain(kCFBooleanTrue));
-    vt::LogCapture log(VPLogLevel::Info);
-    plugin->open(service, 0);
-    VPDispatchDrain();
-    EXPECT_TRUE(log.contains("Use sysconfig calibration to calibrate sensor\n"));
-    EXPECT_EQ(log.count("Getting QVT calibration...\n"), 0u);
-}
-
-TEST_F(Open, SpectrumToProcessReplacesBringUp)
-{
-    publishOwned("SysConfigCalibration", CFRetain(kCFBooleanFalse));
-    publishOwned("ALSCalibrationSpectrumToProcess", CFRetain(kCFBooleanTrue));
-    vt::LogCapture log(VPLogLevel::Info);
-    plugin->open(service, 0);
-    VPDispatchDrain();
-    EXPECT_TRUE(log.contains("Don't use sysconfig calibration to calibrate sensor\n"));
-    EXPECT_EQ(log.count("Getting QVT calibration...\n"), 0u);
+    struct Case {
+        CFBooleanRef sysConfig, spectrumToProcess;
+        const char* line;
+    };
+    for (const Case& c : {Case{nullptr, nullptr, "Getting QVT calibration...\n"},
+                          Case{kCFBooleanTrue, nullptr, "Use sysconfig calibration to calibrate sensor\n"},
+                          Case{kCFBooleanFalse, kCFBooleanTrue, "Don't use sysconfig calibration to calibrate sensor\n"}}) {
+        SCOPED_TRACE(c.line);
+        VPServicePublishProperty(service, CFSTR("SysConfigCalibration"), c.sysConfig);
+        VPServicePublishProperty(service, CFSTR("ALSCalibrationSpectrumToProcess"), c.spectrumToProcess);
+        VantishPlugIn* fresh = static_cast<VantishPlugIn*>(VantishPlugInFactory(nullptr, kIOHIDServiceFilterPlugInTypeID));
+        vt::LogCapture log(VPLogLevel::Info);
+        fresh->open(service, 0);
+        VPDispatchDrain();
+        EXPECT_TRUE(log.contains(c.line));
+        EXPECT_EQ(log.count("Getting QVT calibration...\n"), c.sysConfig ? 0u : 1u);
+        fresh->Release();
+    }
 }
 
 } // namespace

@@ -62,24 +62,25 @@ const std::string kShortLine =
 
 } // namespace
 
-TEST_F(SampleLog, FullLineWithFilteredLux)
+TEST_F(SampleLog, FullLineWithAndWithoutFilteredLux)
 {
-    const Record record = fullRecord();
-    Event e = event(&record);
-    EXPECT_EQ(logged(e.get(), false),
-              std::vector<std::string>{"[ALS] ts=1234.568 lux=123.457 filteredLux=1234.500 xy=(0.300 0.400) "
-                                       "chs=[1 2 3 4 6] CCT1=6504.250 gain=4x mode=ASYNC subsamples=3 "
-                                       "rawLux=120.500 nits=250 xTalk=[1 2 3 4 5] status=0x0A copyEvent=0"});
-}
-
-TEST_F(SampleLog, FullLineWithoutFilteredLux)
-{
-    const Record record = fullRecord().filteredLuxValid(0).mode(0).gain(-0x48000);
-    Event e = event(&record);
-    EXPECT_EQ(logged(e.get(), true),
-              std::vector<std::string>{"[ALS] ts=1234.568 lux=123.457 xy=(0.300 0.400) chs=[1 2 3 4 6] "
-                                       "CCT1=6504.250 gain=-5x mode=SYNC subsamples=3 rawLux=120.500 nits=250 "
-                                       "xTalk=[1 2 3 4 5] status=0x0A copyEvent=1"});
+    struct Case {
+        Record record;
+        bool copy;
+        std::string line;
+    };
+    const Case cases[] = {
+        {fullRecord(), false,
+         "[ALS] ts=1234.568 lux=123.457 filteredLux=1234.500 xy=(0.300 0.400) chs=[1 2 3 4 6] CCT1=6504.250 gain=4x "
+         "mode=ASYNC subsamples=3 rawLux=120.500 nits=250 xTalk=[1 2 3 4 5] status=0x0A copyEvent=0"},
+        {fullRecord().filteredLuxValid(0).mode(0).gain(-0x48000), true,
+         "[ALS] ts=1234.568 lux=123.457 xy=(0.300 0.400) chs=[1 2 3 4 6] CCT1=6504.250 gain=-5x mode=SYNC "
+         "subsamples=3 rawLux=120.500 nits=250 xTalk=[1 2 3 4 5] status=0x0A copyEvent=1"},
+    };
+    for (const Case& c : cases) {
+        Event e = event(&c.record);
+        EXPECT_EQ(logged(e.get(), c.copy), std::vector<std::string>{c.line});
+    }
 }
 
 TEST_F(SampleLog, ShortLineWithoutAFullRecord)
@@ -125,10 +126,7 @@ TEST_F(SampleLog, OnlyForSensorType8AndALSEventsAtTheDefaultLevel)
 
 TEST_F(SampleLog, FilterLogsTheEventAsClientsReceiveIt)
 {
-    plugin->chromaticityOverrideActive = 1;
-    plugin->overrideX = 0.3127;
-    plugin->overrideY = 0.3290;
-    plugin->overrideLuminance = 100.0;
+    overrideChromaticity(*plugin, 0.3127, 0.3290, 100.0);
     Event e = event(nullptr);
     vt::LogCapture log;
     plugin->filter(e.get(), false);

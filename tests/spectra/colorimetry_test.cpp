@@ -12,12 +12,11 @@ using namespace spectra;
 
 TEST(Colorimetry, StandardIlluminantsHaveTheirPublishedChromaticities)
 {
-    const Xy a = chromaticity(tristimulus(cieA()));
-    EXPECT_NEAR(a.x, 0.4476, 1e-3);
-    EXPECT_NEAR(a.y, 0.4074, 1e-3);
-    const Xy d65 = chromaticity(tristimulus(cieD65()));
-    EXPECT_NEAR(d65.x, 0.3127, 1e-3);
-    EXPECT_NEAR(d65.y, 0.3290, 1e-3);
+    for (const auto& [illuminant, published] : {std::pair{cieA(), Xy{0.4476, 0.4074}}, {cieD65(), Xy{0.3127, 0.3290}}}) {
+        const Xy xy = chromaticity(tristimulus(illuminant));
+        EXPECT_NEAR(xy.x, published.x, 1e-3);
+        EXPECT_NEAR(xy.y, published.y, 1e-3);
+    }
 }
 
 TEST(Colorimetry, IlluminanceScalingSetsYAndKeepsChromaticity)

@@ -1,18 +1,19 @@
-// The reference database files as the plug-in reads them: every value as text
-// from sqlite3_exec, converted with atof.
+// The reference database files: read back through the plug-in's own reader,
+// reproducible, bounded, and naming their sources for the tools.
 #include "spectra/Colorimetry.h"
 #include "spectra/ReferenceDatabase.h"
 
+#include "lightdb/LDBM.h"
 #include "support/TestSupport.h"
 
+#include <VantishPlatform/Paths.h>
 #include <gtest/gtest.h>
 #include <sqlite3.h>
 
-#include <cstdlib>
+#include <algorithm>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
-#include <map>
 #include <string>
 #include <vector>
 
@@ -20,22 +21,24 @@ using namespace spectra;
 
 namespace {
 
-using Row = std::map<std::string, std::string>;
+struct Consumed {
+    std::vector<const Source*> expected;
+    size_t rows = 0;
+    size_t mismatches = 0;
+};
 
-std::vector<Row> selectAll(const std::string& path, const std::string& sql)
+int check(void* context, int id, float* xyz, float* spectrum, int sampleCount)
 {
-    sqlite3* db = nullptr;
-    EXPECT_EQ(sqlite3_open_v2(path.c_str(), &db, SQLITE_OPEN_READONLY, nullptr), SQLITE_OK);
-    std::vector<Row> rows;
-    const auto collect = [](void* out, int n, char** values, char** names) {
-        Row row;
-        for (int i = 0; i < n; ++i) row[names[i]] = values[i] ? values[i] : "NULL";
-        static_cast<std::vector<Row>*>(out)->push_back(std::move(row));
-        return 0;
-    };
-    EXPECT_EQ(sqlite3_exec(db, sql.c_str(), collect, &rows, nullptr), SQLITE_OK);
-    sqlite3_close(db);
-    return rows;
+    auto& c = *static_cast<Consumed*>(context);
+    ++c.rows;
+    const Spectrum& s = c.expected.at(size_t(id))->spectrum;
+    const Xyz expected = tristimulus(s);
+    if (sampleCount != kSamples || xyz[0] != float(expected.X) || xyz[1] != float(kReferenceLux) ||
+        xyz[2] != float(expected.Z))
+        ++c.mismatches;
+    for (int i = 0; i < sampleCount; ++i)
+        if (spectrum[i] != float(s[size_t(i)])) ++c.mismatches;
+    return 0;
 }
 
 std::string bytesOf(const std::filesystem::path& p)
@@ -44,38 +47,34 @@ std::string bytesOf(const std::filesystem::path& p)
     return std::string(std::istreambuf_iterator<char>(in), {});
 }
 
-float asRead(const std::string& text) { return float(std::atof(text.c_str())); }
-
 } // namespace
 
-TEST(ReferenceDatabase, HoldsEverySourceInTheFormatThePlugInReads)
+TEST(ReferenceDatabase, ThePlugInReadsBothShippedFilesCompletely)
 {
-    vt::TempDir dir;
-    const std::string path = (dir.path() / "bzlight.sqlite").string();
-    const std::vector<const Source*> sources = referenceSources(ReferenceSet::Default);
-    writeReferenceDatabase(path, 1.0f, sources);
+    vt::TempDir root;
+    std::filesystem::create_directories(root.path() / "Vantish.plugin");
+    VPSetPathRoot("/System/Library/HIDPlugins", root.str());
 
-    const std::vector<Row> info = selectAll(path, "SELECT * FROM Info");
-    ASSERT_EQ(info.size(), 1u);
-    EXPECT_EQ(asRead(info[0].at("version")), 1.0f);
-    EXPECT_EQ(std::atoi(info[0].at("sources").c_str()), int(sources.size()));
+    for (const ReferenceFile& file : kReferenceFiles) {
+        SCOPED_TRACE(file.fileName);
+        const BigDBType type = file.set == ReferenceSet::Default ? BigDBTypeDefault : BigDBType02;
+        Consumed consumed{referenceSources(file.set)};
+        ASSERT_LE(consumed.expected.size(), kMaxReferenceSources);
+        writeReferenceDatabase(VPMapPath(LDBMBigDBPath(type)), file.version, consumed.expected);
 
-    const std::vector<Row> rows = selectAll(path, "SELECT * FROM Spectra");
-    ASSERT_EQ(rows.size(), sources.size());
-    ASSERT_LE(rows.size(), kMaxReferenceSources);
-    for (size_t r = 0; r < rows.size(); ++r) {
-        const Row& row = rows[r];
-        ASSERT_EQ(row.size(), 405u);
-        const int id = std::atoi(row.at("ID").c_str());
-        ASSERT_EQ(id, int(r)) << "IDs run 0..N-1 in set order";
-        const Spectrum& s = sources[size_t(id)]->spectrum;
-        const Xyz xyz = tristimulus(s);
-        EXPECT_EQ(asRead(row.at("X")), float(xyz.X));
-        EXPECT_EQ(asRead(row.at("Y")), float(kReferenceLux));
-        EXPECT_EQ(asRead(row.at("Z")), float(xyz.Z));
-        for (int i = 0; i < kSamples; ++i)
-            ASSERT_EQ(asRead(row.at("S" + std::to_string(i))), float(s[size_t(i)])) << sources[size_t(id)]->name << " " << i;
+        LDBMInfo info;
+        sqlite3* db = nullptr;
+        ASSERT_EQ(sqlite3_open_v2(VPMapPath(LDBMBigDBPath(type)).c_str(), &db, SQLITE_OPEN_READONLY, nullptr), SQLITE_OK);
+        EXPECT_EQ(sqlite3_exec(db, "SELECT * FROM Info", LDBMReadInfoRow, &info, nullptr), SQLITE_OK);
+        sqlite3_close(db);
+        EXPECT_EQ(info.version, file.version);
+        EXPECT_EQ(size_t(info.sources), consumed.expected.size());
+
+        EXPECT_EQ(LDBMParseBigDB(&info, check, &consumed, type), 0);
+        EXPECT_EQ(consumed.rows, consumed.expected.size());
+        EXPECT_EQ(consumed.mismatches, 0u);
     }
+    VPClearPathRoots();
 }
 
 TEST(ReferenceDatabase, IsReproducibleAndLeavesNoSideFiles)
@@ -99,4 +98,22 @@ TEST(ReferenceDatabase, RefusesMoreSourcesThanAPerChipDatabaseHolds)
     const std::vector<const Source*> tooMany(kMaxReferenceSources + 1, &catalogue().front());
     EXPECT_THROW(writeReferenceDatabase((dir.path() / "x.sqlite").string(), 1.0f, tooMany), std::invalid_argument);
     EXPECT_FALSE(std::filesystem::exists(dir.path() / "x.sqlite"));
+}
+
+TEST(ReferenceDatabase, EverySourceIsNamedInIdOrder)
+{
+    vt::TempDir dir;
+    const std::string path = (dir.path() / "small.sqlite").string();
+    writeReferenceDatabase(path, 1.0f, {findSource("planck-2856K"), findSource("cie-f11"), findSource("lps")});
+
+    sqlite3* db = nullptr;
+    ASSERT_EQ(sqlite3_open_v2(path.c_str(), &db, SQLITE_OPEN_READONLY, nullptr), SQLITE_OK);
+    std::vector<std::string> rows;
+    const auto collect = [](void* out, int, char** values, char**) {
+        static_cast<std::vector<std::string>*>(out)->push_back(std::string(values[0]) + ":" + values[1]);
+        return 0;
+    };
+    EXPECT_EQ(sqlite3_exec(db, "SELECT ID, name FROM Names ORDER BY ID", collect, &rows, nullptr), SQLITE_OK);
+    sqlite3_close(db);
+    EXPECT_EQ(rows, (std::vector<std::string>{"0:planck-2856K", "1:cie-f11", "2:lps"}));
 }

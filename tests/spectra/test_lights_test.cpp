@@ -1,13 +1,9 @@
-// The built-in test lights are distinct lights that no reference set holds,
-// and the reference files name their sources for the tools.
+// The built-in test lights are distinct lights that no reference set holds.
+#include "spectra/Catalogue.h"
 #include "spectra/Colorimetry.h"
-#include "spectra/ReferenceDatabase.h"
 #include "spectra/TestLights.h"
 
-#include "support/TestSupport.h"
-
 #include <gtest/gtest.h>
-#include <sqlite3.h>
 
 #include <algorithm>
 #include <cmath>
@@ -55,25 +51,6 @@ TEST(TestLights, AreNoReferenceSourceAndDistinct)
     EXPECT_NE(findSource("cie-b"), nullptr);
     EXPECT_NE(findSource("cie-c"), nullptr);
     EXPECT_EQ(findTestLight("cie-b"), nullptr);
-}
-
-TEST(ReferenceNames, EverySourceIsNamedInIdOrder)
-{
-    vt::TempDir dir;
-    const std::string path = (dir.path() / "small.sqlite").string();
-    const std::vector<const Source*> sources = {findSource("planck-2856K"), findSource("cie-f11"), findSource("lps")};
-    writeReferenceDatabase(path, 1.0f, sources);
-
-    sqlite3* db = nullptr;
-    ASSERT_EQ(sqlite3_open_v2(path.c_str(), &db, SQLITE_OPEN_READONLY, nullptr), SQLITE_OK);
-    std::vector<std::string> rows;
-    const auto collect = [](void* out, int, char** values, char**) {
-        static_cast<std::vector<std::string>*>(out)->push_back(std::string(values[0]) + ":" + values[1]);
-        return 0;
-    };
-    EXPECT_EQ(sqlite3_exec(db, "SELECT ID, name FROM Names ORDER BY ID", collect, &rows, nullptr), SQLITE_OK);
-    sqlite3_close(db);
-    EXPECT_EQ(rows, (std::vector<std::string>{"0:planck-2856K", "1:cie-f11", "2:lps"}));
 }
 
 } // namespace

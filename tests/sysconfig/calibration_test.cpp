@@ -26,26 +26,19 @@ TEST_F(Calibration, NeedsARegistryEntryAndDataBlob)
 
 TEST_F(Calibration, RejectsBadHeaders)
 {
-    {
+    const Bytes whole = blob({GenericEntry{}.bytes()});
+    const std::string size = std::to_string(whole.size()), oneMore = std::to_string(whole.size() + 1);
+    const std::pair<Bytes, std::string> cases[] = {
+        {Bytes(7).u8(1, 1), "Need at least header size bytes. Actual: 7, Expected: 8\n"},
+        {blob({GenericEntry{}.bytes()}, 0, 2), "unsupported calibration version: 2\n"},
+        {blob({GenericEntry{}.bytes()}, 0, 1, uint16_t(whole.size() + 1)),
+         "Insufficient calibration data size. Actual: " + size + ", Expected: " + oneMore + "\n"},
+    };
+    for (const auto& [bytes, error] : cases) {
         vt::LogCapture log;
-        publish("alsCalibration", Bytes(7).u8(1, 1));
-        EXPECT_FALSE(plugin_->processSysConfigCalibration(true, true, true));
-        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Need at least header size bytes. Actual: 7, Expected: 8\n"));
-    }
-    {
-        vt::LogCapture log;
-        publish("alsCalibration", blob({GenericEntry{}.bytes()}, 0, 2));
-        EXPECT_FALSE(plugin_->processSysConfigCalibration(true, true, true));
-        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "unsupported calibration version: 2\n"));
-    }
-    {
-        vt::LogCapture log;
-        const Bytes b = blob({GenericEntry{}.bytes()});
-        publish("alsCalibration", blob({GenericEntry{}.bytes()}, 0, 1, uint16_t(b.size() + 1)));
-        EXPECT_FALSE(plugin_->processSysConfigCalibration(true, true, true));
-        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Insufficient calibration data size. Actual: " +
-                                                        std::to_string(b.size()) + ", Expected: " +
-                                                        std::to_string(b.size() + 1) + "\n"));
+        publish("alsCalibration", bytes);
+        EXPECT_FALSE(plugin_->processSysConfigCalibration(true, true, true)) << error;
+        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, error));
     }
     EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u);
 }
@@ -55,7 +48,9 @@ TEST_F(Calibration, GenericRecordFromTheEntry)
     vt::LogCapture log;
     const Bytes b = blob({GenericEntry{}.bytes()});
     publish("alsCalibration", b);
+    plugin_->colorAlgoOverride = 5; // beats the entry's algorithm 3
     EXPECT_TRUE(plugin_->processSysConfigCalibration(true, true, false));
+    EXPECT_EQ(plugin_->algoVersion.load(), 5);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO,
                              "supported calibration version 1,0 with size " + std::to_string(b.size()) + "\n"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO,
@@ -163,14 +158,6 @@ TEST_F(Calibration, NoEntryForTheOrientationDoesNothing)
     EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
 }
 
-TEST_F(Calibration, AlgorithmOverrideAppliesWhenPushing)
-{
-    publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    plugin_->colorAlgoOverride = 5;
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(true, true, false));
-    EXPECT_EQ(plugin_->algoVersion.load(), 5);
-}
-
 TEST_F(Calibration, RefusedRecordSkipsTheDatabase)
 {
     vt::LogCapture log;
@@ -229,8 +216,6 @@ TEST_F(Calibration, OpenOnAServiceThatAsksForIt)
     EXPECT_TRUE(plugin_->isDbReady());
 }
 
-// ---- VD6286 -------------------------------------------------------------------------
-
 TEST_F(Calibration, VD6286EntryMustHoldTheWholeLayout)
 {
     VD6286Entry entry;
@@ -241,6 +226,7 @@ TEST_F(Calibration, VD6286EntryMustHoldTheWholeLayout)
         EXPECT_FALSE(plugin_->processSysConfigCalibration(true, true, true));
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR,
                                  "Calibration data are smaller than ALSCalibrationDataVD6286 structure."));
+        EXPECT_FALSE(log.contains("Algo version: 2 NSamples: 401\n")); // no spectrum read either
     }
     entry.entrySize = 4156;
     vt::LogCapture log;

@@ -10,6 +10,7 @@
 #include <array>
 #include <atomic>
 #include <thread>
+#include <tuple>
 
 using namespace sctest;
 
@@ -82,40 +83,37 @@ TEST_F(Database, RevisionOneMovesTheSpectraFourBytes)
     expectDatabase(plugin_->snapshotDatabase().db, kGenericResponses);
 }
 
-TEST_F(Database, GainCountOtherThanEightOrNineKeepsThePushResult)
+// Spectrum blocks the database cannot be built from; a record pushed before
+// the build keeps its result.
+TEST_F(Database, UnusableSpectrumBlocksBuildNothing)
 {
-    vt::LogCapture log;
-    GenericEntry entry;
-    entry.nGains = 7;
-    publish("alsCalibration", blob({entry.bytes()}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, true, true)); // the record was set
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Calibration entry has 7 gains; its spectrum block follows 8 or 9.\n"));
-    EXPECT_FALSE(log.contains("Parsed big DB\n"));
-    EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
-}
-
-TEST_F(Database, SpectraLongerThanTheBlockAreRejected)
-{
-    vt::LogCapture log;
-    GenericEntry entry;
-    entry.nSamples = 402;
-    publish("alsCalibration", blob({entry.bytes()}));
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(false, false, true));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Calibration spectrum declares 402 samples; at most 401 are supported.\n"));
-    EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
-}
-
-TEST_F(Database, SpectraShorterThanTheReferenceAreNotBuilt)
-{
-    vt::LogCapture log;
-    GenericEntry entry;
-    entry.nSamples = 400;
-    publish("alsCalibration", blob({entry.bytes()}));
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(false, false, true));
-    EXPECT_FALSE(log.contains("Parsed big DB\n"));
-    EXPECT_FALSE(std::filesystem::exists(cacheFile()));
-    EXPECT_FALSE(plugin_->isDbReady());
-    EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
+    struct Case {
+        uint8_t nGains;
+        uint16_t nSamples;
+        bool push;
+        const char* error; // nullptr: none expected
+    };
+    const Case cases[] = {
+        {7, 401, true, "Calibration entry has 7 gains; its spectrum block follows 8 or 9.\n"},
+        {9, 402, false, "Calibration spectrum declares 402 samples; at most 401 are supported.\n"},
+        {9, 400, false, nullptr}, // shorter than the reference
+    };
+    for (const Case& c : cases) {
+        SCOPED_TRACE(testing::Message() << int(c.nGains) << " gains, " << c.nSamples << " samples");
+        vt::LogCapture log;
+        GenericEntry entry;
+        entry.nGains = c.nGains;
+        entry.nSamples = c.nSamples;
+        publish("alsCalibration", blob({entry.bytes()}));
+        EXPECT_EQ(plugin_->processSysConfigCalibration(false, c.push, true), c.push);
+        if (c.error) {
+            EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, c.error));
+        }
+        EXPECT_FALSE(log.contains("Parsed big DB\n"));
+        EXPECT_FALSE(std::filesystem::exists(cacheFile()));
+        EXPECT_FALSE(plugin_->isDbReady());
+        EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
+    }
 }
 
 TEST_F(Database, MissingReferenceDatabaseKeepsThePushResult)
@@ -128,8 +126,6 @@ TEST_F(Database, MissingReferenceDatabaseKeepsThePushResult)
     EXPECT_FALSE(plugin_->processSysConfigCalibration(false, false, true));
     EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
 }
-
-// ---- Infrared compensation ----------------------------------------------------------
 
 // Responses of flat channels v with the tail (last 196 of 401 samples) scaled
 // by factor x coefficient, normalised to a weighted total of 300.
@@ -161,40 +157,32 @@ TEST_F(Database, AuxiliaryBlobScalesTheInfraredTail)
                    compensated({100, 200, 300, 400}, {0.5, 1.0, 1.5, 2.0}, 32767.0f / 400.0f));
 }
 
-TEST_F(Database, AuxiliaryBlobWithoutAnEntryForTheOrientation)
+// The factor scales the tail's largest magnitude to 32767; a silent tail
+// gives 1 and the most negative sample must not overflow its magnitude.
+TEST_F(Database, InfraredFactorAtTheTailExtremes)
 {
-    vt::LogCapture log;
-    publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    publish("alsAuxCalibration", blob({auxEntry(2, {500000, 1000000, 1500000, 2000000})}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
-    EXPECT_TRUE(log.contains("ALS auxiliary calibration found \n"));
-    EXPECT_FALSE(anyLineContaining(log, "IR compensation coeffs"));
-    expectDatabase(plugin_->snapshotDatabase().db, kGenericResponses);
-}
-
-TEST_F(Database, SilentInfraredTailGivesFactorOne)
-{
-    vt::LogCapture log;
-    GenericEntry entry;
-    entry.spectrum = [](unsigned s, unsigned c) { return int16_t(s < 205 ? 100 * (c + 1) : 0); };
-    publish("alsCalibration", blob({entry.bytes()}));
+    const std::pair<SpectrumFn, const char*> cases[] = {
+        {[](unsigned s, unsigned c) { return int16_t(s < 205 ? 100 * (c + 1) : 0); },
+         "| NIR max: 0 | NIR factor: 1.000000\n "},
+        {[](unsigned s, unsigned c) { return int16_t(s == 300 && c == 2 ? -32768 : 100 * (c + 1)); },
+         "| NIR max: 32768 | NIR factor: 0.999969\n "},
+    };
     publish("alsAuxCalibration", blob({auxEntry(1, {1000000, 1000000, 1000000, 1000000})}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
-    EXPECT_TRUE(anyLineContaining(log, "| NIR max: 0 | NIR factor: 1.000000\n "));
+    for (const auto& [spectrum, line] : cases) {
+        SCOPED_TRACE(line);
+        vt::LogCapture log;
+        GenericEntry entry;
+        entry.spectrum = spectrum;
+        publish("alsCalibration", blob({entry.bytes()}));
+        std::filesystem::remove_all(roots_.cacheDir());
+        EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
+        EXPECT_TRUE(anyLineContaining(log, line));
+    }
 }
 
-TEST_F(Database, MostNegativeTailValueKeepsTheFactorPositive)
-{
-    vt::LogCapture log;
-    GenericEntry entry;
-    entry.spectrum = [](unsigned s, unsigned c) { return int16_t(s == 300 && c == 2 ? -32768 : 100 * (c + 1)); };
-    publish("alsCalibration", blob({entry.bytes()}));
-    publish("alsAuxCalibration", blob({auxEntry(1, {1000000, 1000000, 1000000, 1000000})}));
-    plugin_->processSysConfigCalibration(false, false, true);
-    EXPECT_TRUE(anyLineContaining(log, "| NIR max: 32768 | NIR factor: 0.999969\n "));
-}
-
-TEST_F(Database, HostileAuxiliaryBlobsLeaveTheSpectraUncompensated)
+// Without an entry for the orientation, or with a hostile one, the spectra
+// stay uncompensated.
+TEST_F(Database, AuxiliaryBlobsThatCompensateNothing)
 {
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
     const int32_t k[4] = {2000000, 2000000, 2000000, 2000000};
@@ -203,24 +191,28 @@ TEST_F(Database, HostileAuxiliaryBlobsLeaveTheSpectraUncompensated)
     Bytes shortEntry = blob({auxEntry(1, k, 16)});
     shortEntry.resize(8 + 16);
     Bytes zeroSize = blob({auxEntry(1, k, 0)});
-    const std::vector<std::pair<Bytes, std::string>> cases = {
-        {pastTheEnd, "alsAuxCalibration entry 0 at offset 8: 56 bytes run past the end of the data (48 bytes).\n"},
-        {shortEntry, "alsAuxCalibration entry of 16 bytes is too short for its coefficients (56 bytes).\n"},
-        {zeroSize, "alsAuxCalibration entry 0 at offset 8: entry size 0 is smaller than its subheader.\n"},
-        {Bytes(5), "alsAuxCalibration of 5 bytes is shorter than its header.\n"},
+    const std::vector<std::tuple<Bytes, os_log_type_t, std::string>> cases = {
+        {blob({auxEntry(2, k)}), OS_LOG_TYPE_INFO, "ALS auxiliary calibration found \n"}, // no entry for orientation 1
+        {pastTheEnd, OS_LOG_TYPE_ERROR,
+         "alsAuxCalibration entry 0 at offset 8: 56 bytes run past the end of the data (48 bytes).\n"},
+        {shortEntry, OS_LOG_TYPE_ERROR,
+         "alsAuxCalibration entry of 16 bytes is too short for its coefficients (56 bytes).\n"},
+        {zeroSize, OS_LOG_TYPE_ERROR,
+         "alsAuxCalibration entry 0 at offset 8: entry size 0 is smaller than its subheader.\n"},
+        {Bytes(5), OS_LOG_TYPE_ERROR,
+         "alsAuxCalibration of 5 bytes is shorter than its header.\n"},
     };
-    for (const auto& [aux, error] : cases) {
+    for (const auto& [aux, type, line] : cases) {
+        SCOPED_TRACE(line);
         vt::LogCapture log;
         std::filesystem::remove_all(roots_.cacheDir());
         publish("alsAuxCalibration", aux);
-        EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true)) << error;
-        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, error));
+        EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
+        EXPECT_TRUE(log.contains(type, line));
         EXPECT_FALSE(anyLineContaining(log, "IR compensation coeffs"));
         expectDatabase(plugin_->snapshotDatabase().db, kGenericResponses);
     }
 }
-
-// ---- VD6286 ------------------------------------------------------------------------------
 
 TEST_F(Database, VD6286SpectraBuildFiveChannels)
 {
@@ -243,35 +235,20 @@ TEST_F(Database, VD6286SpectrumChecks)
 {
     plugin_->numberOfChannels = 5;
     plugin_->dbChannelCount = 5;
-    {
-        vt::LogCapture log;
-        VD6286Entry entry;
-        entry.entrySize = 4152;
-        publish("alsCalibration", blob({entry.bytes()}));
-        EXPECT_FALSE(plugin_->processSysConfigCalibration(false, false, true));
-        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Calibration data are smaller than ALSCalibrationDataVD6286 structure."));
-        EXPECT_FALSE(log.contains("Algo version: 2 NSamples: 401\n"));
-    }
-    {
-        vt::LogCapture log;
-        VD6286Entry entry;
-        entry.nSamples = 402;
-        publish("alsCalibration", blob({entry.bytes()}));
-        EXPECT_FALSE(plugin_->processSysConfigCalibration(false, false, true));
-        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Calibration spectrum of 402 samples and 5 channels does not fit the "
-                                                    "entry (at most 401 samples, 2006 values).\n"));
-    }
-    {
-        VD6286Entry entry;
-        plugin_->colorAlgoOverride = 5;
-        publish("alsCalibration", blob({entry.bytes()}));
-        EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
-        EXPECT_EQ(plugin_->algoVersion.load(), 5);
-    }
+    vt::LogCapture log;
+    VD6286Entry entry;
+    entry.nSamples = 402;
+    publish("alsCalibration", blob({entry.bytes()}));
+    EXPECT_FALSE(plugin_->processSysConfigCalibration(false, false, true));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Calibration spectrum of 402 samples and 5 channels does not fit the "
+                                                "entry (at most 401 samples, 2006 values).\n"));
+
+    plugin_->colorAlgoOverride = 5;
+    publish("alsCalibration", blob({VD6286Entry{}.bytes()}));
+    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
+    EXPECT_EQ(plugin_->algoVersion.load(), 5);
     EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u);
 }
-
-// ---- The cache-writing task -------------------------------------------------------------
 
 TEST_F(Database, SynchronousWriteIntoAnUnwritableFolder)
 {
@@ -283,15 +260,6 @@ TEST_F(Database, SynchronousWriteIntoAnUnwritableFolder)
     EXPECT_FALSE(plugin_->isDbReady());
     // The database itself is complete and published; only colour waits for a cache.
     expectDatabase(plugin_->snapshotDatabase().db, kGenericResponses);
-}
-
-TEST_F(Database, QueuedWriteSetsDbReady)
-{
-    publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(true, true, true));
-    VPDispatchDrain();
-    EXPECT_TRUE(std::filesystem::exists(cacheFile()));
-    EXPECT_TRUE(plugin_->isDbReady());
 }
 
 TEST_F(Database, QueuedWriteOutlivesTheHostsRelease)
