@@ -1,7 +1,8 @@
 // Calibration bring-up after open: the unit's factory calibration, or the
 // built-in default with colour adaptation off.
-#include "calibration/CFOwned.h"
-#include "plugin/Log.h"
+#include "support/CFOwned.h"
+#include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 #include <sys/sysctl.h>
 

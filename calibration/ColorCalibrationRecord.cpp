@@ -1,7 +1,7 @@
 #include "calibration/ColorCalibrationRecord.h"
 
 #include "calibration/DriverRecords.h"
-#include "plugin/Log.h"
+#include "support/Log.h"
 
 namespace calib {
 

@@ -1,7 +1,8 @@
 // The built-in calibration the driver gets when the unit's own cannot be used.
-#include "calibration/CFOwned.h"
+#include "support/CFOwned.h"
 #include "calibration/DriverRecords.h"
-#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 #include <optional>
 

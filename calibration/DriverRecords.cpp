@@ -93,12 +93,4 @@ void ChannelRecord::setChannelBlock(unsigned channel, const ChannelBlock& block)
         put<uint16_t>(at + form.gainScale + 2 * g, block.gainScale[g]);
 }
 
-const ChannelRecordLayout* channelRecordLayoutForSize(size_t size)
-{
-    for (const ChannelRecordLayout* layout : {&kFourChannelRecord, &kFiveChannelRecord, &kSixChannelRecord})
-        if (layout->size == size)
-            return layout;
-    return nullptr;
-}
-
 } // namespace driver

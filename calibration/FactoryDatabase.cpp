@@ -1,13 +1,14 @@
 #include "calibration/FactoryDatabase.h"
 
-#include "calibration/CFOwned.h"
+#include "support/CFOwned.h"
 #include "calibration/ColorCalibrationRecord.h"
 #include "calibration/SpectrumExtraction.h"
-#include "calibration/VD6287Layout.h"
-#include "calibration/XwCAT2Layout.h"
-#include "calibration/XwClLayout.h"
+#include "formats/VD6287Layout.h"
+#include "formats/XwCAT2Layout.h"
+#include "formats/XwClLayout.h"
 #include "lightdb/LDBM.h"
-#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 #include <memory>
 #include <utility>

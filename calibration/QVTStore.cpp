@@ -1,11 +1,12 @@
 // Calibration from the factory-data store: reading the record (with retries
 // while the store is not ready on Dravik OS), recognising and parsing it into
 // the driver record, and then the per-chip database.
-#include "calibration/CFOwned.h"
+#include "support/CFOwned.h"
 #include "calibration/FactoryDatabase.h"
-#include "calibration/VD6287Layout.h"
+#include "formats/VD6287Layout.h"
 #include "calibration/XwClFormat.h"
-#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 #include <QVT/QVT.h>
 

@@ -1,10 +1,11 @@
 #include "calibration/SpectrumExtraction.h"
 
-#include "calibration/VD6287Layout.h"
-#include "calibration/XwCAT2Layout.h"
-#include "calibration/XwClLayout.h"
-#include "plugin/Log.h"
-#include "plugin/LittleEndian.h"
+#include "formats/VD6287Layout.h"
+#include "formats/XwCAT2Layout.h"
+#include "formats/XwClLayout.h"
+#include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
+#include "support/LittleEndian.h"
 
 namespace calib {
 namespace {

@@ -1,8 +1,9 @@
-#include "calibration/VD6287Layout.h"
+#include "formats/VD6287Layout.h"
 
-#include "calibration/CFOwned.h"
+#include "support/CFOwned.h"
 #include "calibration/DriverRecords.h"
-#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 #include <optional>
 

@@ -1,9 +1,10 @@
-#include "calibration/XwCAT2Layout.h"
+#include "formats/XwCAT2Layout.h"
 
-#include "calibration/CFOwned.h"
+#include "support/CFOwned.h"
 #include "calibration/ChipId.h"
 #include "calibration/DriverRecords.h"
-#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 #include <Tessary/Tessary.h>
 

@@ -2,7 +2,8 @@
 
 #include "calibration/ChipId.h"
 #include "calibration/DriverRecords.h"
-#include "plugin/Log.h"
+#include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 namespace calib {
 namespace {

@@ -3,8 +3,8 @@
 // channel spectra.
 #pragma once
 
-#include "calibration/CFOwned.h"
-#include "calibration/XwClLayout.h"
+#include "support/CFOwned.h"
+#include "formats/XwClLayout.h"
 #include "lightdb/LDBMInfo.h"
 #include "plugin/VantishPlugIn.h"
 

@@ -4,7 +4,7 @@
 // the solver fits a channel-to-XYZ matrix to the weighted samples, and the
 // matrix is applied to the measurement.
 #include "colour/SolverSupport.h"
-#include "plugin/Log.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 
 #include <algorithm>

@@ -4,7 +4,7 @@
 //
 // Sample matrices are rows x samples, row-major: element (row r, sample i) is
 // at r*n + i, so a sample's vector is a column with stride n.
-#include "plugin/Log.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 
 #include <cmath>

@@ -18,7 +18,7 @@
 //   byte, then key and value for each), nested at most 4 deep.
 #include "support/FuzzSupport.h"
 
-#include "calibration/CFOwned.h"
+#include "support/CFOwned.h"
 
 #include <VantishPlatform/HIDHost.h>
 

@@ -10,10 +10,10 @@
 // layout's exact size (XwCl: two entries when longer than one).
 #include "support/FuzzSupport.h"
 
-#include "calibration/CFOwned.h"
+#include "support/CFOwned.h"
 #include "calibration/SpectrumExtraction.h"
-#include "calibration/VD6287Layout.h"
-#include "calibration/XwCAT2Layout.h"
+#include "formats/VD6287Layout.h"
+#include "formats/XwCAT2Layout.h"
 #include "calibration/XwClFormat.h"
 
 #include <cstdlib>

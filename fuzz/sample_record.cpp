@@ -16,7 +16,7 @@
 //   rest     the record
 #include "support/FuzzSupport.h"
 
-#include "calibration/CFOwned.h"
+#include "support/CFOwned.h"
 
 #include <IOKit/hid/IOHIDEvent.h>
 

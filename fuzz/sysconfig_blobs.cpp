@@ -14,7 +14,7 @@
 // "alsAuxCalibration".
 #include "support/FuzzSupport.h"
 
-#include "calibration/CFOwned.h"
+#include "support/CFOwned.h"
 
 #include <IOKit/IOKitLib.h>
 #include <VantishPlatform/HIDHost.h>

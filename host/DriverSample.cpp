@@ -1,6 +1,6 @@
 #include "host/DriverSample.h"
 
-#include "plugin/LittleEndian.h"
+#include "support/LittleEndian.h"
 
 namespace host {
 

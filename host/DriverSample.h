@@ -3,7 +3,7 @@
 // and, as its vendor-defined child, the 137-byte sample record.
 #pragma once
 
-#include "plugin/ALSSampleRecord.h"
+#include "formats/ALSSampleRecord.h"
 
 #include <IOKit/hid/IOHIDEvent.h>
 

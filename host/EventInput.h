@@ -16,7 +16,7 @@
 //   filteredLuxValid 0; ts = row index x 0.1 (event time in seconds, 0 to 1.8e10).
 #pragma once
 
-#include "plugin/ALSSampleRecord.h"
+#include "formats/ALSSampleRecord.h"
 
 #include <nlohmann/json.hpp>
 

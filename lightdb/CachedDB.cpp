@@ -1,5 +1,5 @@
 #include "lightdb/LDBM.h"
-#include "plugin/Log.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 
 #include <new>

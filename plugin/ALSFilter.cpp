@@ -6,9 +6,10 @@
 // Called for every sample on the host's thread: nothing here allocates, and
 // one snapshot of the database serves the whole call, however calibration
 // replaces it meanwhile.
-#include "plugin/ALSSampleRecord.h"
+#include "formats/ALSSampleRecord.h"
+#include "plugin/SampleRecordBytes.h"
 #include "plugin/ChromaticityOverride.h"
-#include "plugin/Log.h"
+#include "support/Log.h"
 #include "plugin/SpikeDetector.h"
 #include "plugin/VantishPlugIn.h"
 

@@ -2,8 +2,9 @@
 // has done its work, so the line shows what clients receive. With the
 // driver's full sample record attached the line carries the record's details;
 // otherwise a short line from the event's own fields.
-#include "plugin/ALSSampleRecord.h"
-#include "plugin/Log.h"
+#include "formats/ALSSampleRecord.h"
+#include "plugin/SampleRecordBytes.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 
 #include <cstdio>

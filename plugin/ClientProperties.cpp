@@ -1,7 +1,8 @@
 // Properties that clients of the event system set on the ALS service: the test
 // overrides of channels and chromaticity, two tuning values, and the command
 // that rebuilds calibration and databases.
-#include "plugin/Log.h"
+#include "support/CFTypes.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 
 #include <algorithm>
@@ -10,25 +11,9 @@
 
 namespace {
 
-bool isNumber(CFTypeRef value) { return value && CFGetTypeID(value) == CFNumberGetTypeID(); }
-
-std::optional<int> intValue(CFTypeRef value)
-{
-    int result = 0;
-    if (!isNumber(value))
-        return std::nullopt;
-    CFNumberGetValue(static_cast<CFNumberRef>(value), kCFNumberIntType, &result);
-    return result;
-}
-
-std::optional<double> doubleValue(CFTypeRef value)
-{
-    double result = 0.0;
-    if (!isNumber(value))
-        return std::nullopt;
-    CFNumberGetValue(static_cast<CFNumberRef>(value), kCFNumberDoubleType, &result);
-    return result;
-}
+using cf::doubleValue;
+using cf::intValue;
+using cf::isNumber;
 
 CFArrayRef asArray(CFTypeRef value)
 {

@@ -1,7 +1,7 @@
 // Events that a client copies from the service instead of receiving them
 // through the event stream: they get the colour of the last filtered sample.
 #include "plugin/ChromaticityOverride.h"
-#include "plugin/Log.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 
 #include <array>

@@ -1,8 +1,9 @@
 // Opening the plug-in on a service: configuration from the service's
 // properties, the device tree and device information, then calibration
 // bring-up queued on the high-priority global queue.
-#include "plugin/LittleEndian.h"
-#include "plugin/Log.h"
+#include "support/CFTypes.h"
+#include "support/LittleEndian.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 
 #include <Tessary/Tessary.h>
@@ -12,14 +13,9 @@
 
 namespace {
 
-bool isNumber(CFTypeRef value) { return value && CFGetTypeID(value) == CFNumberGetTypeID(); }
-bool isData(CFTypeRef value) { return value && CFGetTypeID(value) == CFDataGetTypeID(); }
-
-std::span<const uint8_t> bytesOf(CFTypeRef data)
-{
-    CFDataRef d = static_cast<CFDataRef>(data);
-    return {CFDataGetBytePtr(d), size_t(CFDataGetLength(d))};
-}
+using cf::bytesOf;
+using cf::isData;
+using cf::isNumber;
 
 // A device-tree property found on the entry or one of its ancestors (retained), or null.
 CFTypeRef copyDeviceTreeProperty(io_registry_entry_t entry, CFStringRef key)
@@ -31,12 +27,7 @@ CFTypeRef copyDeviceTreeProperty(io_registry_entry_t entry, CFStringRef key)
 // A service property read as int, or nothing when absent or not a number.
 std::optional<int> serviceInt(IOHIDServiceRef service, CFStringRef key)
 {
-    CFTypeRef value = IOHIDServiceGetProperty(service, key);
-    int result = 0;
-    if (!isNumber(value))
-        return std::nullopt;
-    CFNumberGetValue(static_cast<CFNumberRef>(value), kCFNumberIntType, &result);
-    return result;
+    return cf::intValue(IOHIDServiceGetProperty(service, key));
 }
 
 // The device-information answer for `question` compared with `expected`.

@@ -4,7 +4,7 @@
 // report zero lux and zero colour for that sample.
 #pragma once
 
-#include "plugin/ALSSampleRecord.h"
+#include "formats/ALSSampleRecord.h"
 
 #include <cstdint>
 

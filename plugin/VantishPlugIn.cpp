@@ -1,16 +1,13 @@
 // The plug-in object: factory, construction, the COM entry points, the
-// interface table, the log handles, publication of the per-chip database and
+// interface table, publication of the per-chip database and
 // queued work that keeps the instance alive.
 #include "plugin/VantishPlugIn.h"
 
-#include "plugin/Log.h"
+#include "support/Log.h"
 
 #include <mach/mach_time.h>
 
 #include <new>
-
-std::atomic<os_log_t> _BRENZEL_LOG_DEFAULT{nullptr};
-std::atomic<os_log_t> pluginLog{nullptr};
 
 namespace {
 
@@ -24,27 +21,6 @@ CFUUIDRef vantishFactoryID()
 VantishPlugIn* self(void* p) { return static_cast<VantishPlugIn*>(p); }
 
 } // namespace
-
-os_log_t init_default_brenzel_log()
-{
-    os_log_t log = os_log_create(VANTISH_FRAMEWORK_LOG_SUBSYSTEM, "default");
-    if (!log) {
-        if (os_log_type_enabled(OS_LOG_DEFAULT, OS_LOG_TYPE_ERROR))
-            _os_log_emit(OS_LOG_DEFAULT, OS_LOG_TYPE_ERROR, "Failed to create Brenzel default log");
-        log = OS_LOG_DEFAULT;
-    }
-    _BRENZEL_LOG_DEFAULT = log;
-    return log;
-}
-
-os_log_t vantishLog()
-{
-    if (os_log_t log = pluginLog.load())
-        return log;
-    if (os_log_t log = _BRENZEL_LOG_DEFAULT.load())
-        return log;
-    return init_default_brenzel_log();
-}
 
 IOHIDServiceFilterPlugInInterface VantishPlugIn::sVantishPlugInFtbl = {
     nullptr,

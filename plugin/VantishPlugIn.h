@@ -176,11 +176,3 @@ public:
     mutable std::mutex dbMutex;                // guards database and dbReady
     std::recursive_mutex calibrationMutex;      // one calibration at a time per instance
 };
-
-// Process-wide log handles: the framework's default log and the plug-in's own.
-extern std::atomic<os_log_t> _BRENZEL_LOG_DEFAULT;
-extern std::atomic<os_log_t> pluginLog;
-os_log_t init_default_brenzel_log();
-
-#define VANTISH_FRAMEWORK_LOG_SUBSYSTEM "org.vantish.brenzel"
-#define VANTISH_PLUGIN_LOG_SUBSYSTEM VANTISH_FRAMEWORK_LOG_SUBSYSTEM ".Vantish"

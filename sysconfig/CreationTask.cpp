@@ -11,7 +11,7 @@
 // recursive, so the in-place task of a synchronous build runs under the lock
 // its caller already holds.
 #include "lightdb/LDBM.h"
-#include "plugin/Log.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 #include "sysconfig/DatabaseBuild.h"
 

@@ -1,7 +1,7 @@
 // The common end of a configuration-supplied build, and the Matrices record
 // that carries a calibration entry's spectra into the reference scan.
 #include "lightdb/LDBM.h"
-#include "plugin/Log.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 #include "sysconfig/DatabaseBuild.h"
 

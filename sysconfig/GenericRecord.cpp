@@ -3,7 +3,7 @@
 #include "sysconfig/GenericRecord.h"
 
 #include "calibration/DriverRecords.h"
-#include "plugin/LittleEndian.h"
+#include "support/LittleEndian.h"
 #include "sysconfig/FixedPoint.h"
 #include "sysconfig/RecordFields.h"
 

@@ -1,8 +1,8 @@
 // The generic four-channel spectrum step: channel spectra and weights from the
 // entry's spectrum block, optional infrared compensation from
 // "alsAuxCalibration", then the reference scan.
-#include "plugin/LittleEndian.h"
-#include "plugin/Log.h"
+#include "support/LittleEndian.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 #include "sysconfig/DatabaseBuild.h"
 

@@ -1,6 +1,6 @@
 #include "sysconfig/RecordFields.h"
 
-#include "plugin/LittleEndian.h"
+#include "support/LittleEndian.h"
 #include "sysconfig/FixedPoint.h"
 #include "sysconfig/SysConfigFormat.h"
 

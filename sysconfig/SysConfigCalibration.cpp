@@ -2,9 +2,9 @@
 // orientation becomes the driver's calibration record and the source of the
 // per-chip database, which is loaded from its cache or built from the entry's
 // channel spectra.
-#include "calibration/CFOwned.h"
+#include "support/CFOwned.h"
 #include "lightdb/LDBM.h"
-#include "plugin/Log.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 #include "sysconfig/DatabaseBuild.h"
 #include "sysconfig/GenericRecord.h"

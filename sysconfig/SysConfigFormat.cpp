@@ -2,8 +2,8 @@
 // and the generic entry's layout.
 #include "sysconfig/SysConfigFormat.h"
 
-#include "plugin/LittleEndian.h"
-#include "plugin/Log.h"
+#include "support/LittleEndian.h"
+#include "support/Log.h"
 
 std::optional<ALSCalibrationHeader> ALSCalibrationHeader::decode(std::span<const uint8_t> blob)
 {
@@ -31,14 +31,6 @@ std::optional<ALSCalibrationSubHeader> ALSCalibrationSubHeader::decode(std::span
 }
 
 namespace sysconfig {
-
-std::span<const uint8_t> bytesOf(CFDataRef data)
-{
-    const CFIndex length = CFDataGetLength(data);
-    if (length <= 0)
-        return {};
-    return {CFDataGetBytePtr(data), size_t(length)};
-}
 
 std::optional<CalibrationEntry> findCalibrationEntry(std::span<const uint8_t> blob, unsigned entryCount,
                                                      uint32_t orientation, const char* blobName)

@@ -8,6 +8,8 @@
 // rejected with an error line instead of being read.
 #pragma once
 
+#include "support/CFTypes.h"
+
 #include <CoreFoundation/CoreFoundation.h>
 
 #include <cstddef>
@@ -49,8 +51,7 @@ constexpr uint8_t kChipTypeVD6286 = 3;
 // Spectra of every calibration source have this many samples at most.
 constexpr unsigned kMaxSpectrumSamples = 401;
 
-// The bytes of a CFData.
-std::span<const uint8_t> bytesOf(CFDataRef data);
+using cf::bytesOf;
 
 // The entry chosen for an orientation: where it starts in its blob, its
 // subheader, and its bytes (exactly entrySize of them, all inside the blob).

@@ -1,8 +1,8 @@
 // Driver record from a VD6286 registry entry (chip type 3): the 193-byte
 // five-channel layout.
 #include "calibration/DriverRecords.h"
-#include "plugin/LittleEndian.h"
-#include "plugin/Log.h"
+#include "support/LittleEndian.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 #include "sysconfig/FixedPoint.h"
 #include "sysconfig/RecordFields.h"

@@ -1,7 +1,7 @@
 // Channel spectra of a VD6286 registry entry (chip type 3, five channels),
 // then the reference scan. No infrared compensation for this chip.
-#include "plugin/LittleEndian.h"
-#include "plugin/Log.h"
+#include "support/LittleEndian.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 #include "sysconfig/DatabaseBuild.h"
 

@@ -8,9 +8,9 @@
 // With the project's data/ folder, the sample devices seed the targets too:
 // their descriptions, store records and registry blobs, framed as each
 // target reads them.
-#include "calibration/VD6287Layout.h"
-#include "calibration/XwCAT2Layout.h"
-#include "calibration/XwClLayout.h"
+#include "formats/VD6287Layout.h"
+#include "formats/XwCAT2Layout.h"
+#include "formats/XwClLayout.h"
 #include "support/FuzzSupport.h"
 
 #include <nlohmann/json.hpp>

@@ -1,9 +1,9 @@
 #include "host/calib/CalibCodec.h"
 
-#include "calibration/DriverRecords.h"
-#include "calibration/VD6287Layout.h"
-#include "calibration/XwCAT2Layout.h"
-#include "calibration/XwClLayout.h"
+#include "formats/DriverRecordLayouts.h"
+#include "formats/VD6287Layout.h"
+#include "formats/XwCAT2Layout.h"
+#include "formats/XwClLayout.h"
 #include "host/calib/Layouts.h"
 
 #include <algorithm>

@@ -1,6 +1,6 @@
-#include "calibration/VD6287Layout.h"
-#include "calibration/XwCAT2Layout.h"
-#include "calibration/XwClLayout.h"
+#include "formats/VD6287Layout.h"
+#include "formats/XwCAT2Layout.h"
+#include "formats/XwClLayout.h"
 #include "host/calib/Layouts.h"
 
 namespace calibcodec {

@@ -1,6 +1,6 @@
 #include "host/calib/FieldLayout.h"
 
-#include "plugin/LittleEndian.h"
+#include "support/LittleEndian.h"
 
 #include <cmath>
 #include <algorithm>

@@ -2,7 +2,7 @@
 // records, the registry calibration blobs and the driver records.
 #pragma once
 
-#include "calibration/DriverRecords.h"
+#include "formats/DriverRecordLayouts.h"
 #include "host/calib/FieldLayout.h"
 
 namespace calibcodec {

@@ -4,7 +4,7 @@
 // and whether the plug-in treated the sample as a light spike.
 #pragma once
 
-#include "plugin/ALSSampleRecord.h"
+#include "formats/ALSSampleRecord.h"
 
 #include <IOKit/hid/IOHIDEvent.h>
 

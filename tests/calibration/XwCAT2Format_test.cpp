@@ -1,6 +1,6 @@
 #include "CalibrationFixture.h"
 
-#include "calibration/XwCAT2Layout.h"
+#include "formats/XwCAT2Layout.h"
 
 namespace {
 

@@ -1,6 +1,6 @@
 // The plug-in object as the host sees it: factory, interface queries,
 // reference counting, and the log handles.
-#include "plugin/Log.h"
+#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
 #include "support/TestSupport.h"
 

@@ -3,7 +3,7 @@
 // into a plain struct and written back field by field, never cast onto bytes.
 #pragma once
 
-#include <IOKit/hid/IOHIDEvent.h>
+#include "support/LittleEndian.h"
 
 #include <array>
 #include <cstddef>
@@ -68,7 +68,66 @@ struct ALSSampleRecord {
     static bool writeXYZResult(std::span<uint8_t> bytes, const std::array<float, 3>& xyz);
 };
 
-// The record bytes of an ALS event: the vendor data of its first child, as
-// long as the child's announced length. Empty when the event has no child,
-// the child no data, or the length is not positive.
-std::span<uint8_t> sampleRecordBytes(IOHIDEventRef event);
+namespace sample_record_detail {
+
+template <typename T, size_t N>
+inline void getArray(std::span<const uint8_t> bytes, size_t offset, std::array<T, N>& out)
+{
+    for (size_t i = 0; i < N; ++i)
+        out[i] = le::get<T>(bytes, offset + i * sizeof(T));
+}
+
+template <typename T, size_t N>
+inline void putArray(std::span<uint8_t> bytes, size_t offset, const std::array<T, N>& values)
+{
+    for (size_t i = 0; i < N; ++i)
+        le::put<T>(bytes, offset + i * sizeof(T), values[i]);
+}
+
+} // namespace sample_record_detail
+
+inline std::optional<ALSSampleRecord> ALSSampleRecord::decode(std::span<const uint8_t> bytes)
+{
+    if (bytes.size() < kSize)
+        return std::nullopt;
+    const auto record = bytes.first(kSize);
+
+    ALSSampleRecord r;
+    r.status = le::get<uint32_t>(record, kStatusOffset);
+    r.sampleChannelCount = le::get<uint8_t>(record, kSampleChannelCountOffset);
+    r.sampleOrientation = le::get<uint8_t>(record, kSampleOrientationOffset);
+    r.nits = le::get<uint16_t>(record, kNitsOffset);
+    r.integrationTime = le::get<uint32_t>(record, kIntegrationTimeOffset);
+    r.reportInterval = le::get<uint32_t>(record, kReportIntervalOffset);
+    r.gain = le::get<int32_t>(record, kGainOffset);
+    r.lux = le::get<float>(record, kLuxOffset);
+    r.rawLux = le::get<float>(record, kRawLuxOffset);
+    sample_record_detail::getArray(record, kChannelValuesOffset, r.channelValues);
+    r.cct = le::get<float>(record, kCctOffset);
+    r.timestamp = le::get<uint32_t>(record, kTimestampOffset);
+    r.subsamples = le::get<uint16_t>(record, kSubsamplesOffset);
+    r.mode = le::get<uint8_t>(record, kModeOffset);
+    sample_record_detail::getArray(record, kXTalkOffset, r.xTalk);
+    r.xyzInRecord = le::get<uint8_t>(record, kXyzInRecordOffset);
+    sample_record_detail::getArray(record, kXyzResultOffset, r.xyzResult);
+    sample_record_detail::getArray(record, kXyzSensorOffset, r.xyzSensor);
+    r.filteredLux = le::get<float>(record, kFilteredLuxOffset);
+    r.filteredLuxValid = le::get<uint8_t>(record, kFilteredLuxValidOffset);
+    return r;
+}
+
+inline bool ALSSampleRecord::writeChannelValues(std::span<uint8_t> bytes, const std::array<float, 6>& values)
+{
+    if (bytes.size() < kSize)
+        return false;
+    sample_record_detail::putArray(bytes, kChannelValuesOffset, values);
+    return true;
+}
+
+inline bool ALSSampleRecord::writeXYZResult(std::span<uint8_t> bytes, const std::array<float, 3>& xyz)
+{
+    if (bytes.size() < kSize)
+        return false;
+    sample_record_detail::putArray(bytes, kXyzResultOffset, xyz);
+    return true;
+}

@@ -4,9 +4,21 @@
 // arguments are computed only when its level is enabled.
 #pragma once
 
-#include "plugin/VantishPlugIn.h"
-
 #include <os/log.h>
+
+#include <atomic>
+
+#define VANTISH_FRAMEWORK_LOG_SUBSYSTEM "org.vantish.brenzel"
+#define VANTISH_PLUGIN_LOG_SUBSYSTEM VANTISH_FRAMEWORK_LOG_SUBSYSTEM ".Vantish"
+
+// Process-wide log handles: the framework's default log and the plug-in's own
+// (created with the first instance).
+extern std::atomic<os_log_t> _BRENZEL_LOG_DEFAULT;
+extern std::atomic<os_log_t> pluginLog;
+
+// Creates the framework's default log (or falls back to OS_LOG_DEFAULT) and
+// stores it in _BRENZEL_LOG_DEFAULT.
+os_log_t init_default_brenzel_log();
 
 // The handle chosen by the rule above.
 os_log_t vantishLog();
