@@ -7,7 +7,8 @@
 // normal equations, LU solve) as the baseline.
 //
 // Run: bench_colour --benchmark_repetitions=9 --benchmark_report_aggregates_only=true
-#include "plugin/VantishPlugIn.h"
+#include "colour/ColourCalculation.h"
+#include "colour/MatrixUtilities.h"
 
 #include <benchmark/benchmark.h>
 
@@ -73,12 +74,12 @@ SpectralDatabase makeDatabase(int N, int M)
 
 // Unit-length samples, each channel divided by its deviation: what calibration
 // publishes in normalised mode.
-void normalise(VantishPlugIn& plugin, SpectralDatabase& db)
+void normalise(SpectralDatabase& db)
 {
     int N = int(db.dbSampleCount), M = int(db.dbChannelCount);
-    plugin.normalizedByEuklidNorm(db.dbChannelResponses.data(), N, M);
+    normalizedByEuklidNorm(db.dbChannelResponses.data(), N, M);
     db.channelStdDev.assign(M, 0.0f);
-    plugin.calculateSTD(db.dbChannelResponses.data(), db.channelStdDev.data(), N, M);
+    calculateSTD(db.dbChannelResponses.data(), db.channelStdDev.data(), N, M);
     for (int j = 0; j < M; ++j)
         if (db.channelStdDev[j] != 0.0f)
             for (int i = 0; i < N; ++i)
@@ -86,22 +87,20 @@ void normalise(VantishPlugIn& plugin, SpectralDatabase& db)
 }
 
 struct Setup {
-    VantishPlugIn* plugin;
+    FitSettings fit;
     SpectralDatabase db;
     std::vector<float> measured;
 
     Setup(Mode mode, int N, int M)
-        : plugin(static_cast<VantishPlugIn*>(VantishPlugInFactory(kCFAllocatorDefault, kIOHIDServiceFilterPlugInTypeID))),
-          db(makeDatabase(N, M))
+        : db(makeDatabase(N, M))
     {
-        plugin->lambda = mode == Raw ? 0.0f : 0.01f;
-        plugin->lambdaConfigured = mode == Normalised ? 1 : 0;
+        fit.lambda = mode == Raw ? 0.0f : 0.01f;
+        fit.normalised = mode == Normalised;
         if (mode == Normalised)
-            normalise(*plugin, db);
+            normalise(db);
         for (int j = 0; j < M; ++j)
             measured.push_back(0.3f + 0.1f * float((j * 7) % 5));
     }
-    ~Setup() { plugin->Release(); }
 };
 
 // The same fit written plainly in double precision.
@@ -179,7 +178,7 @@ void BM_Colour(benchmark::State& state, Mode mode)
     long before = heapCalls.load();
     for (auto _ : state) {
         std::copy(setup.measured.begin(), setup.measured.end(), x.begin());
-        setup.plugin->colourCalculationDynamic(setup.db, x.data(), xyz, M);
+        colourCalculationDynamic(setup.db, setup.fit, x.data(), xyz, M);
         benchmark::DoNotOptimize(xyz);
     }
     reportHeapCalls(state, before);
@@ -189,9 +188,9 @@ void BM_Baseline(benchmark::State& state, Mode mode)
 {
     Setup setup(mode, int(state.range(0)), int(state.range(1)));
     double xyz[3];
-    double lambda = setup.plugin->lambda.load();
-    double exponent = setup.plugin->weightExponent.load();
-    double offset = setup.plugin->weightOffset.load();
+    double lambda = setup.fit.lambda;
+    double exponent = setup.fit.weightExponent;
+    double offset = setup.fit.weightOffset;
     long before = heapCalls.load();
     for (auto _ : state) {
         baselineColour(setup.db, setup.measured.data(), xyz, mode == Normalised, lambda, exponent, offset);

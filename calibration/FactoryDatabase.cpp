@@ -3,9 +3,11 @@
 #include "support/CFOwned.h"
 #include "calibration/ColorCalibrationRecord.h"
 #include "calibration/SpectrumExtraction.h"
+#include "colour/MatrixUtilities.h"
 #include "formats/VD6287Layout.h"
 #include "formats/XwCAT2Layout.h"
 #include "formats/XwClLayout.h"
+#include "lightdb/CachedDB.h"
 #include "lightdb/LDBM.h"
 #include "plugin/VantishPlugIn.h"
 #include "support/Log.h"
@@ -93,9 +95,9 @@ void normaliseResponses(VantishPlugIn& p, SpectralDatabase& db)
     const int n = int(db.dbSampleCount);
     const int m = int(db.dbChannelCount);
     float* responses = db.dbChannelResponses.data();
-    p.normalizedByEuklidNorm(responses, n, m);
+    normalizedByEuklidNorm(responses, n, m);
     db.channelStdDev.assign(size_t(m), 0.0f);
-    p.calculateSTD(responses, db.channelStdDev.data(), n, m);
+    calculateSTD(responses, db.channelStdDev.data(), n, m);
     for (int c = 0; c < m; ++c) {
         const float deviation = db.channelStdDev[size_t(c)];
         if (deviation == 0.0f)
@@ -138,7 +140,10 @@ void finishFactoryDatabase(VantishPlugIn& p, const FactorySource& source, bool f
 {
     SpectralDatabase db;
     const bool usable = colourChannelsUsable(p.numberOfChannels.load());
-    const bool cached = p.processCachedDB(int(p.dbChannelCount.load()), source.bigDBType, db);
+    const CacheKey key{int(p.orientation.load()), p.smallDBVersion.load(), p.chipId.load()};
+    const bool cached = processCachedDB(key, int(p.dbChannelCount.load()), source.bigDBType, db);
+    if (cached)
+        p.algoVersion = uint8_t(db.dbInfo.algo);
     // A database that is not usable for colour is not published: the one
     // already in place (if any) and dbReady stay as they were.
     bool ready = cached && usable && !forceRebuild;

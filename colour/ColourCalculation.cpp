@@ -3,9 +3,11 @@
 // weighted by how closely its channel vector points in the measured direction,
 // the solver fits a channel-to-XYZ matrix to the weighted samples, and the
 // matrix is applied to the measurement.
+#include "colour/ColourCalculation.h"
+
+#include "colour/MatrixUtilities.h"
 #include "colour/SolverSupport.h"
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
 
 #include <algorithm>
 #include <cmath>
@@ -16,12 +18,10 @@ namespace {
 
 constexpr double kPi = 3.141592653589793;
 
-// The object's colour settings, read once per call.
-struct FitSettings {
-    double exponent;   // p of the similarity weight
-    double offset;     // c added to the cosine distance
-    float lambda;      // ridge parameter
-    bool normalised;   // database and measurement in unit-length, sigma-scaled form
+// The settings as the weights use them: exponent and offset widened once.
+struct WeightSettings {
+    double exponent;
+    double offset;
 };
 
 // The database has samples, is made for channelCount channels (as many as
@@ -116,7 +116,7 @@ bool guardFired(const SimilarityInput& in, const ChunkSums& sums, size_t count)
 // the database (channels with sigma 0 were left unscaled). Stops at the first
 // chunk in which a guard fires.
 bool similarityWeights(const SpectralDatabase& db, const float* channels, int M, const float* sigma,
-                       const FitSettings& settings, float* weights)
+                       const WeightSettings& settings, float* weights)
 {
     SimilarityInput in{db.dbChannelResponses.data(), db.dbSampleCount, M, {}, {}, 0.0, settings.exponent,
                        settings.offset};
@@ -196,16 +196,8 @@ void clampAndLog(float* xyz)
 
 } // namespace
 
-bool VantishPlugIn::colourCalculationDynamic(float* channels, float* xyz, int channelCount)
-{
-    DatabaseSnapshot snapshot = snapshotDatabase();
-    if (!snapshot.db)
-        return false;
-    return colourCalculationDynamic(*snapshot.db, channels, xyz, channelCount);
-}
-
-bool VantishPlugIn::colourCalculationDynamic(const SpectralDatabase& db, float* channels, float* xyz,
-                                             int channelCount)
+bool colourCalculationDynamic(const SpectralDatabase& db, const FitSettings& settings, float* channels, float* xyz,
+                              int channelCount)
 {
     if (!channels || !xyz || channelCount < 1)
         return false;
@@ -219,7 +211,7 @@ bool VantishPlugIn::colourCalculationDynamic(const SpectralDatabase& db, float* 
         return true;
     }
 
-    const FitSettings settings{weightExponent.load(), weightOffset.load(), lambda.load(), lambdaConfigured.load() != 0};
+    const WeightSettings weighting{double(settings.weightExponent), double(settings.weightOffset)};
     const int M = channelCount;
     const size_t N = db.dbSampleCount;
     const float* sigma = settings.normalised ? db.stdDevOrNull() : nullptr;
@@ -232,7 +224,7 @@ bool VantishPlugIn::colourCalculationDynamic(const SpectralDatabase& db, float* 
     bool fitted = false;
     if (!weights || !coefficients || !transform) {
         VLOG_ERROR("Color calculation is out of memory \n");
-    } else if (similarityWeights(db, channels, M, sigma, settings, weights.get())) {
+    } else if (similarityWeights(db, channels, M, sigma, weighting, weights.get())) {
         if (settings.normalised)
             normaliseWeightsAndMeasurement(N, weights.get(), channels, M, sigma);
         hybridSolveWithRegularization(int(N), M, db.dbXYZ.data(), weights.get(), db.dbChannelResponses.data(),

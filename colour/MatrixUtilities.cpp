@@ -1,15 +1,10 @@
-// Small numerical members of the plug-in that use none of its state: unit
-// length for sample vectors, per-row standard deviations, and a row-major
-// matrix product.
-//
-// Sample matrices are rows x samples, row-major: element (row r, sample i) is
-// at r*n + i, so a sample's vector is a column with stride n.
+#include "colour/MatrixUtilities.h"
+
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
 
 #include <cmath>
 
-void VantishPlugIn::normalizedByEuklidNorm(float* data, int n, int m)
+void normalizedByEuklidNorm(float* data, int n, int m)
 {
     if (!data || n < 1)
         return;
@@ -32,7 +27,7 @@ void VantishPlugIn::normalizedByEuklidNorm(float* data, int n, int m)
     }
 }
 
-void VantishPlugIn::calculateSTD(float* data, float* out, int n, int m)
+void calculateSTD(float* data, float* out, int n, int m)
 {
     if (!out || !data || n < 1 || m < 1)
         return;
@@ -55,7 +50,7 @@ void VantishPlugIn::calculateSTD(float* data, float* out, int n, int m)
     }
 }
 
-bool VantishPlugIn::multiplyMatrices(float* A, unsigned rowsA, unsigned colsA, float* B, unsigned rowsB,
+bool multiplyMatrices(float* A, unsigned rowsA, unsigned colsA, float* B, unsigned rowsB,
                                      unsigned colsB, float* C)
 {
     if (colsA != rowsB) {

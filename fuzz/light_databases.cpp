@@ -18,6 +18,7 @@
 // Values are bound as text, so every statement stays a plain insert.
 #include "support/FuzzSupport.h"
 
+#include "lightdb/CachedDB.h"
 #include "lightdb/LDBM.h"
 
 #include <VantishPlatform/Paths.h>
@@ -190,12 +191,9 @@ void run(const Options& o)
     bool valid = false;
     LDBMInitialize(o.orientation, &info, &valid, o.type, o.smallVersion);
 
-    fz::PlugIn plugin;
-    plugin->orientation = uint32_t(o.orientation);
-    plugin->smallDBVersion = o.smallVersion;
-    plugin->chipId = o.chipId;
+    const CacheKey key{o.orientation, o.smallVersion, o.chipId};
     SpectralDatabase db;
-    if (plugin->processCachedDB(o.channels, o.type, db))
+    if (processCachedDB(key, o.channels, o.type, db))
         return;
     if (db.dbSampleCount == 0 || db.dbChannelCount != uint32_t(o.channels))
         return;
@@ -206,7 +204,7 @@ void run(const Options& o)
                           o.chipId, o.smallVersion) != 0)
         return;
     SpectralDatabase cached;
-    plugin->processCachedDB(o.channels, o.type, cached);
+    processCachedDB(key, o.channels, o.type, cached);
 }
 
 } // namespace

@@ -1,16 +1,17 @@
+#include "lightdb/CachedDB.h"
+
 #include "lightdb/LDBM.h"
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
 
 #include <new>
 
 // Works on the caller's private `db` only; the caller publishes it once it is
 // complete, so nothing here is ever seen half-written.
-bool VantishPlugIn::processCachedDB(int channelCount, BigDBType type, SpectralDatabase& db)
+bool processCachedDB(const CacheKey& key, int channelCount, BigDBType type, SpectralDatabase& db)
 {
-    const int cacheOrientation = int(orientation.load());
+    const int cacheOrientation = key.orientation;
     bool valid = false;
-    if (LDBMInitialize(cacheOrientation, &db.dbInfo, &valid, type, smallDBVersion.load()) != 0) {
+    if (LDBMInitialize(cacheOrientation, &db.dbInfo, &valid, type, key.smallDBVersion) != 0) {
         VLOG_DEFAULT("Database not found!\n");
         return false;
     }
@@ -40,11 +41,10 @@ bool VantishPlugIn::processCachedDB(int channelCount, BigDBType type, SpectralDa
         VLOG_DEFAULT("Cached DB corrupted. Recreating");
         return rebuild();
     }
-    if (db.dbInfo.chipID != chipId.load()) {
+    if (db.dbInfo.chipID != key.chipId) {
         VLOG_DEFAULT("Found cached DB for different chip ID. Recreating");
         return rebuild();
     }
     VLOG_DEFAULT("Matching cached DB found");
-    algoVersion.store(uint8_t(db.dbInfo.algo));
     return true;
 }

@@ -6,6 +6,7 @@
 // Called for every sample on the host's thread: nothing here allocates, and
 // one snapshot of the database serves the whole call, however calibration
 // replaces it meanwhile.
+#include "colour/ColourCalculation.h"
 #include "formats/ALSSampleRecord.h"
 #include "plugin/SampleRecordBytes.h"
 #include "plugin/ChromaticityOverride.h"
@@ -154,7 +155,9 @@ XYZ sampleColour(VantishPlugIn& plugin, IOHIDEventRef event, const SpectralDatab
         applyRGBCOverride(plugin, event, record, recordBytes, channel, dbChannels, skip);
 
     XYZ xyz{};
-    plugin.colourCalculationDynamic(db, channel.data(), xyz.data(), int(dbChannels));
+    const FitSettings fit{plugin.weightExponent.load(), plugin.weightOffset.load(), plugin.lambda.load(),
+                          plugin.lambdaConfigured.load() != 0};
+    colourCalculationDynamic(db, fit, channel.data(), xyz.data(), int(dbChannels));
     if (sensorType != eALSSensorTypeVD6287)
         logSample(record, xyz);
 

@@ -112,10 +112,7 @@ ULONG VantishPlugIn::Release()
     const ULONG count = refCount.fetch_sub(1) - 1;
     if (count == 0) {
         // The database (and with it its arrays) goes once the last reader lets go.
-        {
-            std::lock_guard lock(dbMutex);
-            database.reset();
-        }
+        databases.clear();
         this->~VantishPlugIn();
         CFAllocatorDeallocate(kCFAllocatorDefault, this);
     }
@@ -142,35 +139,13 @@ void VantishPlugIn::setPropertyForClient(void* p, CFStringRef key, CFTypeRef val
 
 // ---- Publication of the per-chip database -------------------------------------------
 
-void VantishPlugIn::publishDatabase(SpectralDatabasePtr db, bool ready)
-{
-    SpectralDatabasePtr previous;
-    {
-        std::lock_guard lock(dbMutex);
-        previous = std::move(database);
-        database = std::move(db);
-        dbReady = ready ? 1 : 0;
-    }
-    // `previous` is released here, outside the lock; readers that still hold it keep it alive.
-}
+void VantishPlugIn::publishDatabase(SpectralDatabasePtr db, bool ready) { databases.publish(std::move(db), ready); }
 
-void VantishPlugIn::setDbReady(bool ready)
-{
-    std::lock_guard lock(dbMutex);
-    dbReady = ready ? 1 : 0;
-}
+void VantishPlugIn::setDbReady(bool ready) { databases.setReady(ready); }
 
-VantishPlugIn::DatabaseSnapshot VantishPlugIn::snapshotDatabase() const
-{
-    std::lock_guard lock(dbMutex);
-    return {database, dbReady != 0 && database != nullptr};
-}
+VantishPlugIn::DatabaseSnapshot VantishPlugIn::snapshotDatabase() const { return databases.snapshot(); }
 
-bool VantishPlugIn::isDbReady() const
-{
-    std::lock_guard lock(dbMutex);
-    return dbReady != 0;
-}
+bool VantishPlugIn::isDbReady() const { return databases.isReady(); }
 
 // ---- Queued work ---------------------------------------------------------------------
 

@@ -13,6 +13,7 @@
 #pragma once
 
 #include "lightdb/LDBMInfo.h"
+#include "lightdb/DatabaseSlot.h"
 #include "lightdb/SpectralDatabase.h"
 
 #include <CoreFoundation/CoreFoundation.h>
@@ -78,16 +79,6 @@ public:
     void setPropertyForClient(CFStringRef key, CFTypeRef value, CFTypeRef client);
     void logALSSample(IOHIDEventRef event, bool isCopyEvent);
 
-    // ---- Colour estimation -------------------------------------------------------
-    // Against the published database (taken once for the call).
-    bool colourCalculationDynamic(float* channels, float* xyz, int channelCount);
-    // Against a given database; the filter passes the snapshot it holds.
-    bool colourCalculationDynamic(const SpectralDatabase& db, float* channels, float* xyz, int channelCount);
-    void normalizedByEuklidNorm(float* data, int n, int m);
-    void calculateSTD(float* data, float* out, int n, int m);
-    bool multiplyMatrices(float* A, unsigned rowsA, unsigned colsA, float* B, unsigned rowsB, unsigned colsB,
-                          float* C);
-
     // ---- Factory calibration -------------------------------------------------------
     void runCalibrationBringUp();
     bool calibrateSensorWithDefaultCalibration(eALSSensorType type);
@@ -101,12 +92,6 @@ public:
     bool processQVTSpectrumXwCAT2(CFDataRef& data, Matrices& matrices);
     bool processQVTSpectrumVD6287_XwClv3(CFDataRef& data, Matrices& matrices);
 
-    // ---- Per-chip database -----------------------------------------------------------
-    // Loads the cached database for this chip into `db` (private to the caller)
-    // and returns true, or prepares `db` (Info, arrays sized for a build) and
-    // returns false when the caller has to build.
-    bool processCachedDB(int channelCount, BigDBType type, SpectralDatabase& db);
-
     // ---- Configuration-supplied calibration --------------------------------------------
     bool processSysConfigCalibration(bool asyncCreate, bool pushCalibration, bool processDatabase);
     bool processSysConfigSensorCalibrationVD6286(CFDataRef& blob, long& entryOffset, ALSCalibrationHeader& header,
@@ -119,10 +104,7 @@ public:
                                         const std::shared_ptr<SpectralDatabase>& build);
 
     // ---- Publication of the per-chip database ---------------------------------------------
-    struct DatabaseSnapshot {
-        SpectralDatabasePtr db; // null before the first publication
-        bool ready = false;     // dbReady at the moment of the snapshot
-    };
+    using DatabaseSnapshot = DatabaseSlot::Snapshot;
     // Publishes a complete database and the new dbReady in one step.
     void publishDatabase(SpectralDatabasePtr db, bool ready);
     // Changes dbReady alone (colour off on fallback, on after a cache write).
@@ -146,11 +128,10 @@ public:
     std::atomic<uint8_t> algoVersion{0};
     std::atomic<uint8_t> colorAlgoOverride{0};
     std::atomic<float> smallDBVersion{1.1f};
-    uint8_t dbReady = 0; // guarded by dbMutex; see publishDatabase
     std::atomic<uint32_t> numberOfChannels{0};
     std::atomic<uint32_t> dbChannelCount{0};
     std::atomic<uint32_t> spectrumSampleCount{0};
-    SpectralDatabasePtr database; // guarded by dbMutex: dbSampleCount, dbXYZ, dbChannelResponses, channelStdDev, dbInfo
+    DatabaseSlot databases; // the published database and dbReady
     std::atomic<float> weightExponent{2.0f};
     std::atomic<float> weightOffset{0.00001f};
     std::array<std::atomic<float>, 3> lastXYZ;
@@ -173,6 +154,5 @@ public:
     double machTimeToSeconds = 0.0;
     std::atomic<uint64_t> shortSampleRecords{0}; // sample records too short to read (throttles their log line)
 
-    mutable std::mutex dbMutex;                // guards database and dbReady
     std::recursive_mutex calibrationMutex;      // one calibration at a time per instance
 };

@@ -3,6 +3,7 @@
 // per-chip database, which is loaded from its cache or built from the entry's
 // channel spectra.
 #include "support/CFOwned.h"
+#include "lightdb/CachedDB.h"
 #include "lightdb/LDBM.h"
 #include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
@@ -76,7 +77,9 @@ bool loadOrBuildDatabase(VantishPlugIn& plugin, bool asyncCreate, CFDataRef blob
 {
     const unsigned channels = plugin.numberOfChannels;
     auto db = std::make_shared<SpectralDatabase>();
-    if (plugin.processCachedDB(int(channels), BigDBTypeDefault, *db)) {
+    const CacheKey key{int(plugin.orientation.load()), plugin.smallDBVersion.load(), plugin.chipId.load()};
+    if (processCachedDB(key, int(channels), BigDBTypeDefault, *db)) {
+        plugin.algoVersion = uint8_t(db->dbInfo.algo);
         VLOG_DEFAULT("Found cached DB\n");
         plugin.publishDatabase(std::move(db), true);
         return true;

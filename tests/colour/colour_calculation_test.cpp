@@ -1,7 +1,8 @@
 // The per-event colour estimate against an independent double-precision
 // reference, its guards, and the lines it logs; and the matrix helpers it uses.
 #include "SolverReference.h"
-#include "plugin/VantishPlugIn.h"
+#include "colour/ColourCalculation.h"
+#include "colour/MatrixUtilities.h"
 #include "support/TestSupport.h"
 
 #include <gtest/gtest.h>
@@ -13,13 +14,6 @@
 using namespace colourtest;
 
 namespace {
-
-struct PlugIn {
-    VantishPlugIn* p =
-        static_cast<VantishPlugIn*>(VantishPlugInFactory(kCFAllocatorDefault, kIOHIDServiceFilterPlugInTypeID));
-    ~PlugIn() { p->Release(); }
-    VantishPlugIn* operator->() const { return p; }
-};
 
 using XYZ = std::array<float, 3>;
 
@@ -50,12 +44,12 @@ SpectralDatabase makeDatabase(int N, int M, unsigned seed)
 
 // What calibration does before publishing in normalised mode: unit-length
 // samples, then each channel row divided by its deviation.
-void normaliseDatabase(VantishPlugIn* plugin, SpectralDatabase& db)
+void normaliseDatabase(SpectralDatabase& db)
 {
     int N = int(db.dbSampleCount), M = int(db.dbChannelCount);
-    plugin->normalizedByEuklidNorm(db.dbChannelResponses.data(), N, M);
+    normalizedByEuklidNorm(db.dbChannelResponses.data(), N, M);
     db.channelStdDev.assign(M, 0.0f);
-    plugin->calculateSTD(db.dbChannelResponses.data(), db.channelStdDev.data(), N, M);
+    calculateSTD(db.dbChannelResponses.data(), db.channelStdDev.data(), N, M);
     for (int j = 0; j < M; ++j)
         if (db.channelStdDev[j] != 0.0f)
             for (int i = 0; i < N; ++i)
@@ -127,35 +121,34 @@ const std::vector<float> kMeasured5 = {0.2f, 0.9f, 0.4f, 0.35f, 0.6f};
 const std::vector<float>& measured(int M) { return M == 4 ? kMeasured4 : kMeasured5; }
 
 // Normalised mode with the lambda a configured device uses.
-void useNormalisedMode(PlugIn& plugin)
+void useNormalisedMode(FitSettings& fit)
 {
-    plugin->lambdaConfigured = 1;
-    plugin->lambda = 0.01f;
+    fit.normalised = 1;
+    fit.lambda = 0.01f;
 }
 
 } // namespace
 
 TEST(ColourCalculation, RejectsBadArgumentsAndForeignDatabasesSilently)
 {
-    PlugIn plugin;
+    FitSettings fit;
     SpectralDatabase db = makeDatabase(50, 4, 1);
     std::vector<float> x = kMeasured4;
     XYZ xyz = {-1.0f, 2.0f, 3.0f};
     vt::LogCapture log;
-    EXPECT_FALSE(plugin->colourCalculationDynamic(db, nullptr, xyz.data(), 4));
-    EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), nullptr, 4));
-    EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 0));
-    EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), -3));
+    EXPECT_FALSE(colourCalculationDynamic(db, fit, nullptr, xyz.data(), 4));
+    EXPECT_FALSE(colourCalculationDynamic(db, fit, x.data(), nullptr, 4));
+    EXPECT_FALSE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), 0));
+    EXPECT_FALSE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), -3));
     SpectralDatabase empty;
     empty.allocate(0, 4);
-    EXPECT_FALSE(plugin->colourCalculationDynamic(empty, x.data(), xyz.data(), 4));
+    EXPECT_FALSE(colourCalculationDynamic(empty, fit, x.data(), xyz.data(), 4));
     SpectralDatabase five = makeDatabase(50, 5, 2);
-    EXPECT_FALSE(plugin->colourCalculationDynamic(five, x.data(), xyz.data(), 4));
+    EXPECT_FALSE(colourCalculationDynamic(five, fit, x.data(), xyz.data(), 4));
     SpectralDatabase truncated = makeDatabase(50, 4, 3);
     truncated.dbXYZ.resize(100);
-    EXPECT_FALSE(plugin->colourCalculationDynamic(truncated, x.data(), xyz.data(), 4));
+    EXPECT_FALSE(colourCalculationDynamic(truncated, fit, x.data(), xyz.data(), 4));
     // Nothing published yet: the calculation against the object's database does nothing either.
-    EXPECT_FALSE(plugin->colourCalculationDynamic(x.data(), xyz.data(), 4));
     EXPECT_EQ(xyz, (XYZ{-1.0f, 2.0f, 3.0f}));
     EXPECT_EQ(x, kMeasured4);
     EXPECT_TRUE(log.lines().empty());
@@ -163,13 +156,13 @@ TEST(ColourCalculation, RejectsBadArgumentsAndForeignDatabasesSilently)
 
 TEST(ColourCalculation, AllZeroChannelsTakeTheShortcut)
 {
-    PlugIn plugin;
-    useNormalisedMode(plugin);
+    FitSettings fit;
+    useNormalisedMode(fit);
     SpectralDatabase db = makeDatabase(50, 4, 4);
     std::vector<float> x(4, 0.0f);
     XYZ xyz = {5.0f, 5.0f, 5.0f};
     vt::LogCapture log;
-    EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 4));
+    EXPECT_TRUE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), 4));
     EXPECT_EQ(xyz, (XYZ{0.0f, 0.0f, 0.0f}));
     EXPECT_EQ(log.messages(), (std::vector<std::string>{"All channels are zero. Take a shortcut",
                                                         "Color: X=0.000000(0.000000) Y=0.000000(0.000000) "
@@ -190,15 +183,15 @@ TEST(ColourCalculation, EveryModeMatchesTheReference)
                              Mode{"normalised", true, 0.01f, 30}}) {
         for (int M : {4, 5}) {
             SCOPED_TRACE(testing::Message() << mode.what << ", M=" << M);
-            PlugIn plugin;
-            plugin->lambdaConfigured = mode.configured;
-            plugin->lambda = mode.lambda;
+            FitSettings fit;
+            fit.normalised = mode.configured;
+            fit.lambda = mode.lambda;
             SpectralDatabase db = makeDatabase(400, M, mode.seed + M);
             if (mode.configured)
-                normaliseDatabase(plugin.p, db);
+                normaliseDatabase(db);
             std::vector<float> x = measured(M);
             XYZ xyz{};
-            EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), M));
+            EXPECT_TRUE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), M));
             expectClose(xyz, reference(db, measured(M), mode.configured, mode.lambda), 1e-4);
             // Without normalisation the measurement is not touched.
             if (!mode.configured) {
@@ -210,14 +203,14 @@ TEST(ColourCalculation, EveryModeMatchesTheReference)
 
 TEST(ColourCalculation, ChannelsWithoutSpreadStayUnscaled)
 {
-    PlugIn plugin;
-    useNormalisedMode(plugin);
+    FitSettings fit;
+    useNormalisedMode(fit);
     SpectralDatabase db = makeDatabase(300, 4, 40);
-    normaliseDatabase(plugin.p, db);
+    normaliseDatabase(db);
     db.channelStdDev[2] = 0.0f; // as calibration leaves a channel that does not vary
     std::vector<float> x = kMeasured4;
     XYZ xyz{};
-    EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 4));
+    EXPECT_TRUE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), 4));
     expectClose(xyz, reference(db, kMeasured4, true, 0.01), 1e-4);
     // The measurement's channel 2 is unit-length scaled only.
     EXPECT_FLOAT_EQ(x[2], kMeasured4[2] / float(Eigen::Vector4d(0.8, 0.3, 0.55, 0.2).norm()));
@@ -225,14 +218,14 @@ TEST(ColourCalculation, ChannelsWithoutSpreadStayUnscaled)
 
 TEST(ColourCalculation, ScalingTheMeasurementKeepsTheWeights)
 {
-    PlugIn plugin;
+    FitSettings fit;
     SpectralDatabase db = makeDatabase(400, 5, 50);
     auto colour = [&](float factor) {
         std::vector<float> x = kMeasured5;
         for (float& v : x)
             v *= factor;
         XYZ xyz{};
-        EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 5));
+        EXPECT_TRUE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), 5));
         return xyz;
     };
     // Raw mode: the same fit applied to a scaled vector.
@@ -240,8 +233,8 @@ TEST(ColourCalculation, ScalingTheMeasurementKeepsTheWeights)
     for (int c = 0; c < 3; ++c)
         EXPECT_NEAR(many[c], 37.5f * one[c], 1e-5 * 37.5f * one[c]);
     // Normalised mode: the measurement's scale is gone before the fit.
-    useNormalisedMode(plugin);
-    normaliseDatabase(plugin.p, db);
+    useNormalisedMode(fit);
+    normaliseDatabase(db);
     one = colour(1.0f);
     many = colour(37.5f);
     for (int c = 0; c < 3; ++c)
@@ -250,7 +243,7 @@ TEST(ColourCalculation, ScalingTheMeasurementKeepsTheWeights)
 
 TEST(ColourCalculation, NegativeComponentsAreReportedAsZero)
 {
-    PlugIn plugin;
+    FitSettings fit;
     SpectralDatabase db = makeDatabase(200, 4, 80);
     // Z falls with channel 0 and rises with channel 3; a measurement strong in
     // channel 0 fits a negative Z.
@@ -259,19 +252,19 @@ TEST(ColourCalculation, NegativeComponentsAreReportedAsZero)
     std::vector<float> x = {0.9f, 0.3f, 0.3f, 0.1f};
     ASSERT_LT(reference(db, x, false, 0.0)(2), 0.0 + 1e-12); // clamped in the reference too
     XYZ xyz{};
-    EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 4));
+    EXPECT_TRUE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), 4));
     EXPECT_EQ(xyz[2], 0.0f);
     EXPECT_GT(xyz[0], 0.0f);
 }
 
 // A calculation that stops: what the caller's result held is kept, but Y
 // is zeroed and negatives clamped, and the reason is logged just before the colour.
-static void expectStopped(PlugIn& plugin, const SpectralDatabase& db, std::vector<float> x, const std::string& reason,
+static void expectStopped(FitSettings& fit, const SpectralDatabase& db, std::vector<float> x, const std::string& reason,
                           size_t lineCount = 2)
 {
     XYZ xyz = {-1.0f, -2.0f, 3.0f};
     vt::LogCapture log;
-    EXPECT_FALSE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), int(x.size())));
+    EXPECT_FALSE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), int(x.size())));
     EXPECT_EQ(xyz, (XYZ{0.0f, 0.0f, 3.0f}));
     std::vector<std::string> lines = log.messages();
     ASSERT_EQ(lines.size(), lineCount);
@@ -283,16 +276,16 @@ static void expectStopped(PlugIn& plugin, const SpectralDatabase& db, std::vecto
 
 TEST(ColourCalculation, ZeroSampleVectorStopsTheCalculation)
 {
-    PlugIn plugin;
+    FitSettings fit;
     SpectralDatabase db = makeDatabase(50, 4, 60);
     for (int j = 0; j < 4; ++j)
         db.dbChannelResponses[size_t(j) * 50 + 17] = 0.0f;
-    expectStopped(plugin, db, kMeasured4, "QiQi x QtQt == 0.000000, can not proceed with color calculation \n");
+    expectStopped(fit, db, kMeasured4, "QiQi x QtQt == 0.000000, can not proceed with color calculation \n");
 }
 
 TEST(ColourCalculation, ZeroDistanceStopsTheCalculation)
 {
-    PlugIn plugin;
+    FitSettings fit;
     SpectralDatabase db = makeDatabase(50, 4, 70);
     // Sample 9 points exactly where the measurement does.
     const std::vector<float> direction = {1.0f, 2.0f, 3.0f, 4.0f};
@@ -301,33 +294,33 @@ TEST(ColourCalculation, ZeroDistanceStopsTheCalculation)
     std::vector<float> x = direction;
     XYZ xyz{};
     // With the default offset the distance cannot reach zero.
-    EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 4));
-    plugin->weightOffset = 0.0f;
-    expectStopped(plugin, db, direction, "di+c == 0, can not proceed with color calculation \n");
+    EXPECT_TRUE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), 4));
+    fit.weightOffset = 0.0f;
+    expectStopped(fit, db, direction, "di+c == 0, can not proceed with color calculation \n");
 }
 
 TEST(ColourCalculation, AFailedFitNeverBecomesAColour)
 {
     // A client lambda far below zero makes the regularised matrix indefinite.
-    PlugIn plugin;
-    plugin->lambdaConfigured = 1;
-    plugin->lambda = -1e6f;
+    FitSettings fit;
+    fit.normalised = 1;
+    fit.lambda = -1e6f;
     SpectralDatabase db = makeDatabase(100, 4, 90);
-    normaliseDatabase(plugin.p, db);
+    normaliseDatabase(db);
     // Normalised mode logs its two steps first.
-    expectStopped(plugin, db, kMeasured4, "Color fit failed, can not proceed with color calculation \n", 4);
+    expectStopped(fit, db, kMeasured4, "Color fit failed, can not proceed with color calculation \n", 4);
 }
 
 TEST(ColourCalculation, NormalisedModeLogsItsSteps)
 {
-    PlugIn plugin;
-    useNormalisedMode(plugin);
+    FitSettings fit;
+    useNormalisedMode(fit);
     SpectralDatabase db = makeDatabase(60, 4, 100);
-    normaliseDatabase(plugin.p, db);
+    normaliseDatabase(db);
     std::vector<float> x = {3.0f, 4.0f, 0.0f, 0.0f};
     XYZ xyz{};
     vt::LogCapture log;
-    EXPECT_TRUE(plugin->colourCalculationDynamic(db, x.data(), xyz.data(), 4));
+    EXPECT_TRUE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), 4));
     std::vector<std::string> lines = log.messages();
     ASSERT_EQ(lines.size(), 3u);
     EXPECT_EQ(lines[0], "Normalization - Euklid norm = 5.000000\n");
@@ -343,21 +336,21 @@ TEST(ColourCalculation, NormalisedModeLogsItsSteps)
 
 TEST(EuklidNorm, ScalesEachSampleToUnitLength)
 {
-    PlugIn plugin;
+    FitSettings fit;
     vt::LogCapture log;
     float v[2] = {3.0f, 4.0f};
-    plugin->normalizedByEuklidNorm(v, 1, 2);
+    normalizedByEuklidNorm(v, 1, 2);
     EXPECT_EQ(v[0], 0.6f);
     EXPECT_EQ(v[1], 0.8f);
     EXPECT_EQ(log.messages(), std::vector<std::string>{"Normalization - Euklid norm = 5.000000\n"});
     // The float pair (0.6, 0.8) is slightly longer than 1, so it is scaled again.
-    plugin->normalizedByEuklidNorm(v, 1, 2);
+    normalizedByEuklidNorm(v, 1, 2);
     EXPECT_EQ(log.lines().size(), 2u);
 
     // A 2 x 3 matrix: three samples, each a column with stride 3.
     float m[6] = {3.0f, 1.0f, 0.0f, 4.0f, 0.0f, 0.0f};
     log.clear();
-    plugin->normalizedByEuklidNorm(m, 3, 2);
+    normalizedByEuklidNorm(m, 3, 2);
     const float want[6] = {0.6f, 1.0f, 0.0f, 0.8f, 0.0f, 0.0f};
     for (int k = 0; k < 6; ++k)
         EXPECT_EQ(m[k], want[k]) << k;
@@ -366,48 +359,48 @@ TEST(EuklidNorm, ScalesEachSampleToUnitLength)
     EXPECT_EQ(log.lines().front().type, OS_LOG_TYPE_DEBUG);
 
     log.clear();
-    plugin->normalizedByEuklidNorm(nullptr, 1, 2);
-    plugin->normalizedByEuklidNorm(v, 0, 2);
+    normalizedByEuklidNorm(nullptr, 1, 2);
+    normalizedByEuklidNorm(v, 0, 2);
     EXPECT_TRUE(log.lines().empty());
 }
 
 TEST(StandardDeviation, PopulationFormPerRow)
 {
-    PlugIn plugin;
+    FitSettings fit;
     vt::LogCapture log;
     float rows[8] = {1, 2, 3, 4, 7, 7, 7, 7};
     float out[2] = {-1.0f, -1.0f};
-    plugin->calculateSTD(rows, out, 4, 2);
+    calculateSTD(rows, out, 4, 2);
     EXPECT_FLOAT_EQ(out[0], std::sqrt(1.25f));
     EXPECT_EQ(out[1], 0.0f);
     EXPECT_EQ(log.messages(), (std::vector<std::string>{"Standard deviation[0]: 1.118034\n",
                                                         "Standard deviation[1]: 0.000000\n"}));
 
     float untouched[1] = {-1.0f};
-    plugin->calculateSTD(rows, untouched, 0, 1);
-    plugin->calculateSTD(rows, untouched, 4, 0);
-    plugin->calculateSTD(nullptr, untouched, 4, 1);
-    plugin->calculateSTD(rows, nullptr, 4, 1);
+    calculateSTD(rows, untouched, 0, 1);
+    calculateSTD(rows, untouched, 4, 0);
+    calculateSTD(nullptr, untouched, 4, 1);
+    calculateSTD(rows, nullptr, 4, 1);
     EXPECT_EQ(untouched[0], -1.0f);
 }
 
 TEST(MatrixProduct, RowMajorWithSizeCheck)
 {
-    PlugIn plugin;
+    FitSettings fit;
     float A[12] = {1, 2, 3, 4, 0, 1, 0, 1, -1, 0.5f, 2, 0};
     float B[5] = {1, 2, 3, 4, 5};
     float C[3] = {9, 9, 9};
-    EXPECT_TRUE(plugin->multiplyMatrices(A, 3, 4, B, 4, 1, C));
+    EXPECT_TRUE(multiplyMatrices(A, 3, 4, B, 4, 1, C));
     EXPECT_EQ(C[0], 30.0f);
     EXPECT_EQ(C[1], 6.0f);
     EXPECT_EQ(C[2], 6.0f);
 
     float untouched[3] = {9, 9, 9};
     vt::LogCapture log;
-    EXPECT_FALSE(plugin->multiplyMatrices(A, 3, 4, B, 5, 1, untouched));
+    EXPECT_FALSE(multiplyMatrices(A, 3, 4, B, 5, 1, untouched));
     EXPECT_EQ(untouched[0], 9.0f);
     EXPECT_EQ(untouched[2], 9.0f);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "wrong matrix size \n"));
     // Nothing to compute is still a match.
-    EXPECT_TRUE(plugin->multiplyMatrices(A, 0, 4, B, 4, 1, untouched));
+    EXPECT_TRUE(multiplyMatrices(A, 0, 4, B, 4, 1, untouched));
 }

@@ -1,5 +1,5 @@
 #include "LightDbFiles.h"
-#include "PlugInHolder.h"
+#include "lightdb/CachedDB.h"
 
 #include "lightdb/LDBM.h"
 
@@ -172,7 +172,7 @@ TEST_F(BigDBTest, MissingReferenceFileCallsNothing)
 // that the rows are not there) is refused as corrupt.
 TEST_F(BigDBTest, MoreSourcesThanADatabaseCanHoldIsCorrupt)
 {
-    ldbtest::PlugInHolder plugin;
+    const CacheKey key;
     for (int sources : {LDBMMaxSources, LDBMMaxSources + 1, 200000000}) {
         SCOPED_TRACE(sources);
         std::filesystem::remove(bigDB());
@@ -188,7 +188,7 @@ TEST_F(BigDBTest, MoreSourcesThanADatabaseCanHoldIsCorrupt)
         EXPECT_FALSE(valid);
 
         SpectralDatabase db;
-        EXPECT_FALSE(plugin->processCachedDB(5, BigDBTypeDefault, db));
+        EXPECT_FALSE(processCachedDB(key, 5, BigDBTypeDefault, db));
         EXPECT_TRUE(db.dbXYZ.empty() && db.dbChannelResponses.empty());
     }
 }

@@ -1,5 +1,5 @@
 #include "LightDbFiles.h"
-#include "PlugInHolder.h"
+#include "lightdb/CachedDB.h"
 
 #include "lightdb/LDBM.h"
 
@@ -23,8 +23,8 @@ protected:
         for (int id = 0; id < kSources; ++id)
             rows.push_back({id, 10.0f + id, 20.0f + id, 30.0f + id, {1.0f, 2.0f + id, 0.5f, 1.0f + 0.25f * id}});
         ldbtest::writeReference(bigDB(), "1.1", kSources, rows);
-        plugin->chipId = 0x5150;
-        plugin->smallDBVersion = 1.3f;
+        key.chipId = 0x5150;
+        key.smallDBVersion = 1.3f;
     }
 
     Matrices channelSpectra(int channels) const
@@ -41,14 +41,13 @@ protected:
     // processCachedDB, and on false a build and a cache write as the callers do.
     bool loadOrBuild(SpectralDatabase& db, int channels = 5)
     {
-        if (plugin->processCachedDB(channels, BigDBTypeDefault, db))
+        if (processCachedDB(key, channels, BigDBTypeDefault, db))
             return true;
         Matrices m = channelSpectra(channels);
         m.bindOutputs(db);
         EXPECT_EQ(LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, BigDBTypeDefault), 0);
         EXPECT_EQ(LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(),
-                                    int(plugin->orientation.load()), plugin->algoVersion.load(), channels,
-                                    plugin->chipId.load(), plugin->smallDBVersion.load()),
+                                    key.orientation, algo, channels, key.chipId, key.smallDBVersion),
                   0);
         return false;
     }
@@ -58,7 +57,8 @@ protected:
         return std::all_of(v.begin(), v.end(), [](float x) { return x == 0.0f; });
     }
 
-    ldbtest::PlugInHolder plugin;
+    CacheKey key;
+    int algo = 0; // the algorithm version a build writes into the cache
     vt::LogCapture log{VPLogLevel::Default};
 };
 
@@ -75,7 +75,7 @@ TEST_F(CachedDBTest, MissingReferenceLeavesTheDatabaseAlone)
 {
     std::filesystem::remove(bigDB());
     SpectralDatabase db;
-    EXPECT_FALSE(plugin->processCachedDB(5, BigDBTypeDefault, db));
+    EXPECT_FALSE(processCachedDB(key, 5, BigDBTypeDefault, db));
     EXPECT_EQ(log.messages(), std::vector<std::string>{"Database not found!\n"});
     EXPECT_EQ(db.dbSampleCount, 0u);
     EXPECT_TRUE(db.dbXYZ.empty());
@@ -83,7 +83,7 @@ TEST_F(CachedDBTest, MissingReferenceLeavesTheDatabaseAlone)
 
 TEST_F(CachedDBTest, BuildsOnceThenLoadsTheSameArrays)
 {
-    plugin->algoVersion = 4;
+    algo = 4;
     SpectralDatabase built;
     ASSERT_FALSE(loadOrBuild(built));
     EXPECT_EQ(log.messages(), (std::vector<std::string>{"nSources: 3 nChannels: 5\n", "Cached DB not found. Recreating"}));
@@ -91,11 +91,11 @@ TEST_F(CachedDBTest, BuildsOnceThenLoadsTheSameArrays)
     EXPECT_FALSE(allZero(built.dbChannelResponses));
 
     log.clear();
-    plugin->algoVersion = 0;
+    algo = 0;
     SpectralDatabase loaded;
-    ASSERT_TRUE(plugin->processCachedDB(5, BigDBTypeDefault, loaded));
+    ASSERT_TRUE(processCachedDB(key, 5, BigDBTypeDefault, loaded));
     EXPECT_EQ(log.messages(), (std::vector<std::string>{"nSources: 3 nChannels: 5\n", "Matching cached DB found"}));
-    EXPECT_EQ(plugin->algoVersion.load(), 4) << "restored from the cache";
+    EXPECT_EQ(loaded.dbInfo.algo, 4) << "restored from the cache";
     EXPECT_EQ(loaded.dbSampleCount, 3u);
     EXPECT_EQ(loaded.dbChannelCount, 5u);
     EXPECT_EQ(loaded.dbInfo.chipID, 0x5150u);
@@ -109,9 +109,9 @@ TEST_F(CachedDBTest, CacheOfAnotherChipOrCorruptedIsRebuiltFromZero)
     SpectralDatabase db;
     loadOrBuild(db);
     const std::pair<std::function<void()>, const char*> rejections[] = {
-        {[&] { plugin->chipId = 0x5151; }, "Found cached DB for different chip ID. Recreating"},
+        {[&] { key.chipId = 0x5151; }, "Found cached DB for different chip ID. Recreating"},
         {[&] {
-             plugin->chipId = 0x5150;
+             key.chipId = 0x5150;
              runSql(cacheFile(1), "INSERT INTO XX VALUES (1, 2, 3);");
          },
          "Cached DB corrupted. Recreating"},
@@ -120,7 +120,7 @@ TEST_F(CachedDBTest, CacheOfAnotherChipOrCorruptedIsRebuiltFromZero)
         reject();
         log.clear();
         SpectralDatabase again;
-        EXPECT_FALSE(plugin->processCachedDB(5, BigDBTypeDefault, again)) << line;
+        EXPECT_FALSE(processCachedDB(key, 5, BigDBTypeDefault, again)) << line;
         EXPECT_TRUE(log.contains(line));
         EXPECT_EQ(again.dbXYZ.size(), 9u);
         EXPECT_TRUE(allZero(again.dbXYZ) && allZero(again.dbChannelResponses)) << line;
@@ -129,12 +129,12 @@ TEST_F(CachedDBTest, CacheOfAnotherChipOrCorruptedIsRebuiltFromZero)
 
 TEST_F(CachedDBTest, ChipIdZeroCacheServesOnlyChipIdZero)
 {
-    plugin->chipId = 0;
+    key.chipId = 0;
     SpectralDatabase db;
     ASSERT_FALSE(loadOrBuild(db, 4));
-    EXPECT_TRUE(plugin->processCachedDB(4, BigDBTypeDefault, db));
-    plugin->chipId = 7;
-    EXPECT_FALSE(plugin->processCachedDB(4, BigDBTypeDefault, db));
+    EXPECT_TRUE(processCachedDB(key, 4, BigDBTypeDefault, db));
+    key.chipId = 7;
+    EXPECT_FALSE(processCachedDB(key, 4, BigDBTypeDefault, db));
     EXPECT_TRUE(log.contains("Found cached DB for different chip ID. Recreating"));
 }
 
@@ -143,7 +143,7 @@ TEST_F(CachedDBTest, FiveChannelCacheLoadsIntoFourRowsWithoutOverrun)
     SpectralDatabase db;
     loadOrBuild(db, 5);
     SpectralDatabase four;
-    ASSERT_TRUE(plugin->processCachedDB(4, BigDBTypeDefault, four));
+    ASSERT_TRUE(processCachedDB(key, 4, BigDBTypeDefault, four));
     ASSERT_EQ(four.dbChannelResponses.size(), 12u);
     expectPrinted(four.dbChannelResponses,
                   std::vector<float>(db.dbChannelResponses.begin(), db.dbChannelResponses.begin() + 12));

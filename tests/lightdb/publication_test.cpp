@@ -1,8 +1,9 @@
 // A database built privately and then published is never seen half-written,
 // and one a reader still holds stays intact while newer ones replace it.
 #include "LightDbFiles.h"
-#include "PlugInHolder.h"
 
+#include "lightdb/CachedDB.h"
+#include "lightdb/DatabaseSlot.h"
 #include "lightdb/LDBM.h"
 
 #include <atomic>
@@ -36,15 +37,18 @@ TEST_F(PublicationTest, ReadersNeverSeeATornDatabase)
     for (int id = 0; id < 64; ++id)
         rows.push_back({id, 1.0f, 1.0f, 1.0f, {1.0f}});
     ldbtest::writeReference(bigDB(), "1.0", 64, rows);
-    ldbtest::PlugInHolder plugin;
+    DatabaseSlot slot;
 
-    std::atomic<bool> done{false};
+    // The reader runs before the first publication and until it has seen the
+    // last one, so its reads really overlap the writer's publications.
+    std::atomic<bool> started{false};
     std::atomic<int> torn{0}, backwards{0}, seen{0};
     std::thread reader([&] {
-        VantishPlugIn::DatabaseSnapshot held;
+        DatabaseSlot::Snapshot held;
         float last = 0.0f;
-        while (!done.load()) {
-            VantishPlugIn::DatabaseSnapshot snap = plugin->snapshotDatabase();
+        while (last < float(kGenerations)) {
+            started = true;
+            DatabaseSlot::Snapshot snap = slot.snapshot();
             if (!snap.db)
                 continue;
             float generation = 0.0f, heldGeneration = 0.0f;
@@ -60,23 +64,24 @@ TEST_F(PublicationTest, ReadersNeverSeeATornDatabase)
             held = snap;
         }
     });
+    while (!started.load())
+        std::this_thread::yield();
 
     for (int g = 1; g <= kGenerations; ++g) {
         SpectralDatabase db;
-        ASSERT_FALSE(plugin->processCachedDB(4 + g % 2, BigDBTypeDefault, db)); // no cache: sized for a build
+        ASSERT_FALSE(processCachedDB(CacheKey{}, 4 + g % 2, BigDBTypeDefault, db)); // no cache: sized for a build
         for (auto* v : {&db.dbXYZ, &db.dbChannelResponses})
             for (float& x : *v)
                 x = float(g);
         db.channelStdDev.assign(db.dbChannelCount, float(g));
-        plugin->publishDatabase(std::make_shared<const SpectralDatabase>(std::move(db)), true);
+        slot.publish(std::make_shared<const SpectralDatabase>(std::move(db)), true);
     }
-    done = true;
     reader.join();
 
     EXPECT_EQ(torn.load(), 0);
     EXPECT_EQ(backwards.load(), 0);
     EXPECT_GT(seen.load(), 0);
-    const auto last = plugin->snapshotDatabase();
+    const auto last = slot.snapshot();
     ASSERT_TRUE(last.ready && last.db);
     float generation = 0.0f;
     EXPECT_TRUE(consistent(*last.db, generation));
