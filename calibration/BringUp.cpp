@@ -1,7 +1,8 @@
 // Calibration bring-up after open: the unit's factory calibration, or the
 // built-in default with colour adaptation off.
+#include "calibration/Calibration.h"
+
 #include "support/CFOwned.h"
-#include "plugin/VantishPlugIn.h"
 #include "support/Log.h"
 
 #include <sys/sysctl.h>
@@ -31,9 +32,9 @@ bool defaultCalibrationForced()
 
 } // namespace
 
-void VantishPlugIn::runCalibrationBringUp()
+void Calibration::runCalibrationBringUp()
 {
-    std::lock_guard lock(calibrationMutex);
+    const auto guard = lock();
     const bool forced = defaultCalibrationForced();
     VLOG_INFO("Getting QVT calibration...\n");
     if (!forced) {
@@ -47,8 +48,8 @@ void VantishPlugIn::runCalibrationBringUp()
     VLOG_DEFAULT("Switching off color adaptation support.\n");
     const int off = 0;
     CFOwned<CFNumberRef> crgb(CFNumberCreate(kCFAllocatorDefault, kCFNumberIntType, &off));
-    if (crgb && service)
-        IOHIDServiceSetProperty(service, CFSTR("crgb"), crgb.get());
-    setDbReady(false);
-    calibrateSensorWithDefaultCalibration(eALSSensorType(sensorType.load()));
+    if (crgb && host_.service())
+        IOHIDServiceSetProperty(host_.service(), CFSTR("crgb"), crgb.get());
+    databases_.setReady(false);
+    calibrateSensorWithDefaultCalibration(eALSSensorType(unit_.sensorType.load()));
 }

@@ -1,7 +1,7 @@
 // The built-in calibration the driver gets when the unit's own cannot be used.
 #include "support/CFOwned.h"
 #include "calibration/DriverRecords.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 #include "support/Log.h"
 
 #include <optional>
@@ -82,7 +82,7 @@ ChannelRecord wideDefault(const ChannelRecordLayout& layout, float lux)
 
 } // namespace
 
-bool VantishPlugIn::calibrateSensorWithDefaultCalibration(eALSSensorType type)
+bool Calibration::calibrateSensorWithDefaultCalibration(eALSSensorType type)
 {
     VLOG_DEFAULT("Calibrate sensor with default calibration data. Sensor type = %d", int(type));
 
@@ -90,32 +90,32 @@ bool VantishPlugIn::calibrateSensorWithDefaultCalibration(eALSSensorType type)
     switch (type) {
     case eALSSensorType4ChannelA:
     case eALSSensorType4ChannelB:
-        record.emplace(fourChannelDefault(type == eALSSensorType4ChannelB, deviceColor.load() == 2));
-        numberOfChannels = 4;
+        record.emplace(fourChannelDefault(type == eALSSensorType4ChannelB, unit_.deviceColor.load() == 2));
+        unit_.numberOfChannels = 4;
         break;
     case eALSSensorType5ChannelA:
     case eALSSensorType5ChannelB:
     case eALSSensorType5ChannelC:
         record.emplace(wideDefault(kFiveChannelRecord, kFiveChannelLux));
-        chipType = 0;
-        numberOfChannels = 5;
-        dbChannelCount = 5;
+        unit_.chipType = 0;
+        unit_.numberOfChannels = 5;
+        unit_.dbChannelCount = 5;
         break;
     case eALSSensorType6ChannelA:
     case eALSSensorType6ChannelB:
         record.emplace(wideDefault(kSixChannelRecord, kSixChannelLux));
-        chipType = 0;
-        numberOfChannels = 6;
-        dbChannelCount = 5;
+        unit_.chipType = 0;
+        unit_.numberOfChannels = 6;
+        unit_.dbChannelCount = 5;
         break;
     default:
         return false;
     }
 
     CFOwned<CFDataRef> data(record->createData());
-    if (!data || !service)
+    if (!data || !host_.service())
         return false;
-    if (!IOHIDServiceSetProperty(service, CFSTR("ALSCalibrationData"), data.get())) {
+    if (!IOHIDServiceSetProperty(host_.service(), CFSTR("ALSCalibrationData"), data.get())) {
         VLOG_ERROR("Failed to set ALS calibration data.");
         return false;
     }

@@ -9,7 +9,7 @@
 #include "formats/XwClLayout.h"
 #include "lightdb/CachedDB.h"
 #include "lightdb/LDBM.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 #include "support/Log.h"
 
 #include <memory>
@@ -30,7 +30,7 @@ bool sizedForBuild(const SpectralDatabase& db, uint32_t rows)
            db.dbXYZ.size() == 3 * n && db.dbChannelResponses.size() == size_t(rows) * n;
 }
 
-bool extractSpectrum(VantishPlugIn& p, const FactorySource& source, Matrices& m)
+bool extractSpectrum(Calibration& p, const FactorySource& source, Matrices& m)
 {
     CFDataRef data = source.data;
     switch (source.layout) {
@@ -49,11 +49,11 @@ bool extractSpectrum(VantishPlugIn& p, const FactorySource& source, Matrices& m)
 
 // Builds `db` (sized by processCachedDB) from the reference spectra and the
 // unit's channel spectra and writes the cache. False when nothing was built.
-bool buildFromSpectra(VantishPlugIn& p, const FactorySource& source, SpectralDatabase& db)
+bool buildFromSpectra(Calibration& p, const FactorySource& source, SpectralDatabase& db)
 {
-    const uint32_t channels = p.numberOfChannels.load();
-    const uint32_t rows = p.dbChannelCount.load();
-    const uint32_t chipType = p.chipType.load();
+    const uint32_t channels = p.unit().numberOfChannels.load();
+    const uint32_t rows = p.unit().dbChannelCount.load();
+    const uint32_t chipType = p.unit().chipType.load();
     if (!sizedForBuild(db, rows) || channels < rows)
         return false;
 
@@ -77,8 +77,8 @@ bool buildFromSpectra(VantishPlugIn& p, const FactorySource& source, SpectralDat
     VLOG_DEFAULT("Parsed big DB\n");
 
     const int code = LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(),
-                                       int(p.orientation.load()), int(p.algoVersion.load()), int(rows),
-                                       p.chipId.load(), p.smallDBVersion.load());
+                                       int(p.unit().orientation.load()), int(p.unit().algoVersion.load()), int(rows),
+                                       p.unit().chipId.load(), p.unit().smallDBVersion.load());
     if (code != 0)
         VLOG_ERROR("Failed to create small DB %d\n", code);
     else
@@ -89,7 +89,7 @@ bool buildFromSpectra(VantishPlugIn& p, const FactorySource& source, SpectralDat
 // Scales every sample's responses to unit length, then every channel by its
 // standard deviation over the samples (channels that do not vary stay as
 // they are). Done on the private database, before anyone can read it.
-void normaliseResponses(VantishPlugIn& p, SpectralDatabase& db)
+void normaliseResponses(Calibration& p, SpectralDatabase& db)
 {
     VLOG_INFO("RR normalization");
     const int n = int(db.dbSampleCount);
@@ -107,16 +107,16 @@ void normaliseResponses(VantishPlugIn& p, SpectralDatabase& db)
     }
 }
 
-void sendColorCalibration(VantishPlugIn& p)
+void sendColorCalibration(Calibration& p)
 {
-    if (!p.service || p.sensorType.load() != eALSSensorTypeVD6287)
+    if (!p.host().service() || p.unit().sensorType.load() != eALSSensorTypeVD6287)
         return;
-    const VantishPlugIn::DatabaseSnapshot snapshot = p.snapshotDatabase();
+    const DatabaseSlot::Snapshot snapshot = p.databases().snapshot();
     if (!snapshot.ready)
         return;
-    CFOwned<CFDataRef> record(createColorCalibrationRecord(*snapshot.db, p.numberOfChannels.load()));
+    CFOwned<CFDataRef> record(createColorCalibrationRecord(*snapshot.db, p.unit().numberOfChannels.load()));
     if (record)
-        IOHIDServiceSetProperty(p.service, CFSTR("ALSColorCalibration"), record.get());
+        IOHIDServiceSetProperty(p.host().service(), CFSTR("ALSColorCalibration"), record.get());
 }
 
 } // namespace
@@ -136,23 +136,23 @@ FactoryLayout factoryLayoutOf(size_t length)
     }
 }
 
-void finishFactoryDatabase(VantishPlugIn& p, const FactorySource& source, bool forceRebuild)
+void finishFactoryDatabase(Calibration& p, const FactorySource& source, bool forceRebuild)
 {
     SpectralDatabase db;
-    const bool usable = colourChannelsUsable(p.numberOfChannels.load());
-    const CacheKey key{int(p.orientation.load()), p.smallDBVersion.load(), p.chipId.load()};
-    const bool cached = processCachedDB(key, int(p.dbChannelCount.load()), source.bigDBType, db);
+    const bool usable = colourChannelsUsable(p.unit().numberOfChannels.load());
+    const CacheKey key{int(p.unit().orientation.load()), p.unit().smallDBVersion.load(), p.unit().chipId.load()};
+    const bool cached = processCachedDB(key, int(p.unit().dbChannelCount.load()), source.bigDBType, db);
     if (cached)
-        p.algoVersion = uint8_t(db.dbInfo.algo);
+        p.unit().algoVersion = uint8_t(db.dbInfo.algo);
     // A database that is not usable for colour is not published: the one
     // already in place (if any) and dbReady stay as they were.
     bool ready = cached && usable && !forceRebuild;
     if (!ready)
         ready = buildFromSpectra(p, source, db) && usable;
     if (ready) {
-        if (p.lambdaConfigured.load())
+        if (p.fit().lambdaConfigured.load())
             normaliseResponses(p, db);
-        p.publishDatabase(std::make_shared<const SpectralDatabase>(std::move(db)), true);
+        p.databases().publish(std::make_shared<const SpectralDatabase>(std::move(db)), true);
     }
     sendColorCalibration(p);
 }

@@ -4,7 +4,7 @@
 #pragma once
 
 #include "lightdb/LDBMInfo.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 
 #include <CoreFoundation/CoreFoundation.h>
 
@@ -33,6 +33,6 @@ struct FactorySource {
 // Loads or builds the database for the calibration just parsed, publishes it
 // when it is complete and usable, and hands it to the driver where the sensor
 // takes it. Runs under the caller's calibration lock.
-void finishFactoryDatabase(VantishPlugIn& plugin, const FactorySource& source, bool forceRebuild);
+void finishFactoryDatabase(Calibration& calibration, const FactorySource& source, bool forceRebuild);
 
 } // namespace calib

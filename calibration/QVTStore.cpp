@@ -5,7 +5,7 @@
 #include "calibration/FactoryDatabase.h"
 #include "formats/VD6287Layout.h"
 #include "calibration/XwClFormat.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 #include "support/Log.h"
 
 #include <QVT/QVT.h>
@@ -27,40 +27,13 @@ void qvtLogHandler(int, const char* message)
     os_log_debug(log, "%s", message);
 }
 
-void scheduleStoreRetry(VantishPlugIn& p)
-{
-    const uint32_t failed = p.qvtRetryCount.fetch_add(1);
-    if (failed >= kStoreRetries)
-        return;
-    VLOG_INFO("Retrieving QVT calibration data failed in attempt number %d/20. Try again in 5 sec.\n",
-              int(failed + 1));
-    p.dispatchAfterRetained(dispatch_time(DISPATCH_TIME_NOW, kStoreRetryDelay),
-                            dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_HIGH, 0),
-                            [&p] { p.loadQVTCalibration(false); });
-}
-
-CFDataRef readFactoryData(VantishPlugIn& p)
-{
-    if (!p.isDravikOS.load()) {
-        if (CFDataRef data = p.copyQVTCalibrationData(CFSTR("XwCA")))
-            return data;
-        return p.copyQVTCalibrationData(CFSTR("XwCl"));
-    }
-    if (CFDataRef data = p.copyQVTCalibrationData(CFSTR("XwCM")))
-        return data;
-    if (CFDataRef data = p.copyQVTCalibrationData(CFSTR("XwCA")))
-        return data;
-    scheduleStoreRetry(p);
-    return nullptr;
-}
-
 struct ParsedRecord {
     CFOwned<CFDataRef> record;
     calib::FactorySource source;
     bool chipMismatch = false;
 };
 
-ParsedRecord parseFactoryData(VantishPlugIn& p, CFDataRef data)
+ParsedRecord parseFactoryData(Calibration& p, CFDataRef data)
 {
     ParsedRecord parsed;
     parsed.source.data = data;
@@ -92,7 +65,34 @@ ParsedRecord parseFactoryData(VantishPlugIn& p, CFDataRef data)
 
 } // namespace
 
-CFDataRef VantishPlugIn::copyQVTCalibrationData(CFStringRef key)
+void Calibration::scheduleStoreRetry()
+{
+    const uint32_t failed = qvtRetryCount_.fetch_add(1);
+    if (failed >= kStoreRetries)
+        return;
+    VLOG_INFO("Retrieving QVT calibration data failed in attempt number %d/20. Try again in 5 sec.\n",
+              int(failed + 1));
+    host_.dispatchAfterRetained(dispatch_time(DISPATCH_TIME_NOW, kStoreRetryDelay),
+                                dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_HIGH, 0),
+                                [this] { loadQVTCalibration(false); });
+}
+
+CFDataRef Calibration::readFactoryData()
+{
+    if (!unit_.isDravikOS.load()) {
+        if (CFDataRef data = copyQVTCalibrationData(CFSTR("XwCA")))
+            return data;
+        return copyQVTCalibrationData(CFSTR("XwCl"));
+    }
+    if (CFDataRef data = copyQVTCalibrationData(CFSTR("XwCM")))
+        return data;
+    if (CFDataRef data = copyQVTCalibrationData(CFSTR("XwCA")))
+        return data;
+    scheduleStoreRetry();
+    return nullptr;
+}
+
+CFDataRef Calibration::copyQVTCalibrationData(CFStringRef key)
 {
     QVTLogSetHandler(qvtLogHandler);
     CFErrorRef error = nullptr;
@@ -106,12 +106,12 @@ CFDataRef VantishPlugIn::copyQVTCalibrationData(CFStringRef key)
     return data;
 }
 
-bool VantishPlugIn::loadQVTCalibration(bool forceRebuild)
+bool Calibration::loadQVTCalibration(bool forceRebuild)
 {
-    std::lock_guard lock(calibrationMutex);
+    const auto guard = lock();
     VLOG_DEBUG("loadQVTCalibration");
 
-    CFOwned<CFDataRef> data(readFactoryData(*this));
+    CFOwned<CFDataRef> data(readFactoryData());
     if (!data)
         return false;
     VLOG_INFO("QVT calibration data length = %ld\n", long(CFDataGetLength(data.get())));
@@ -131,7 +131,7 @@ bool VantishPlugIn::loadQVTCalibration(bool forceRebuild)
         VLOG_ERROR("Failed to parse ALS calibration data.");
         return false;
     }
-    if (service && !IOHIDServiceSetProperty(service, CFSTR("ALSCalibrationData"), parsed.record.get())) {
+    if (host_.service() && !IOHIDServiceSetProperty(host_.service(), CFSTR("ALSCalibrationData"), parsed.record.get())) {
         VLOG_ERROR("Failed to set ALS calibration data.");
         return false;
     }

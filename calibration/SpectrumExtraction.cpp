@@ -3,7 +3,7 @@
 #include "formats/VD6287Layout.h"
 #include "formats/XwCAT2Layout.h"
 #include "formats/XwClLayout.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 #include "support/Log.h"
 #include "support/LittleEndian.h"
 
@@ -49,10 +49,10 @@ int32_t columnSample(const StoredSpectra& sp, bool fold, uint32_t chipType, unsi
     return chipType == 1 ? 2 * value : value + sp.sample(0, s);
 }
 
-bool fill(VantishPlugIn& p, Matrices& m, const StoredSpectra& sp, bool fold, bool infoLog)
+bool fill(Calibration& p, Matrices& m, const StoredSpectra& sp, bool fold, bool infoLog)
 {
-    const uint32_t chipType = p.chipType.load();
-    const uint32_t weightCount = p.numberOfChannels.load();
+    const uint32_t chipType = p.unit().chipType.load();
+    const uint32_t weightCount = p.unit().numberOfChannels.load();
     const unsigned columns = m.nChannels > 0 ? unsigned(m.nChannels) : 0;
     const unsigned storedNeeded = fold ? columns + 1 : columns;
     if (columns < 1 || storedNeeded > sp.channels || weightCount < columns || weightCount > sp.weightSlots) {
@@ -61,7 +61,7 @@ bool fill(VantishPlugIn& p, Matrices& m, const StoredSpectra& sp, bool fold, boo
         return false;
     }
 
-    p.spectrumSampleCount = kSamples;
+    p.unit().spectrumSampleCount = kSamples;
     m.channelSpectra.assign(size_t(kSamples) * columns, 0);
     for (unsigned s = 0; s < kSamples; ++s)
         for (unsigned c = 0; c < columns; ++c)
@@ -74,9 +74,9 @@ bool fill(VantishPlugIn& p, Matrices& m, const StoredSpectra& sp, bool fold, boo
     m.irCoefficients.clear();
 
     if (infoLog)
-        VLOG_INFO("Algo version: %d NSamples: %u\n", int(p.algoVersion.load()), p.spectrumSampleCount.load());
+        VLOG_INFO("Algo version: %d NSamples: %u\n", int(p.unit().algoVersion.load()), p.unit().spectrumSampleCount.load());
     else
-        VLOG_DEFAULT("Algo version: %d NSamples: %u\n", int(p.algoVersion.load()), p.spectrumSampleCount.load());
+        VLOG_DEFAULT("Algo version: %d NSamples: %u\n", int(p.unit().algoVersion.load()), p.unit().spectrumSampleCount.load());
     return true;
 }
 
@@ -90,7 +90,7 @@ std::span<const uint8_t> bytesOfSize(CFDataRef data, size_t size)
 
 } // namespace
 
-bool extractXwClSpectrum(VantishPlugIn& p, std::span<const uint8_t> data, size_t entryOffset, Matrices& m)
+bool extractXwClSpectrum(Calibration& p, std::span<const uint8_t> data, size_t entryOffset, Matrices& m)
 {
     using namespace stored::xwcl;
     if (!le::fits(data.size(), entryOffset, kEntrySize))
@@ -103,12 +103,12 @@ bool extractXwClSpectrum(VantishPlugIn& p, std::span<const uint8_t> data, size_t
                            .weights = entry::luxCoeff,
                            .weightSlots = kStoredChannels,
                            .weightDivisor = 65536.0};
-    return fill(p, m, sp, foldsFirstChannel(p.chipType.load()), true);
+    return fill(p, m, sp, foldsFirstChannel(p.unit().chipType.load()), true);
 }
 
 } // namespace calib
 
-bool VantishPlugIn::processQVTSpectrumXwCAT2(CFDataRef& data, Matrices& matrices)
+bool Calibration::processQVTSpectrumXwCAT2(CFDataRef& data, Matrices& matrices)
 {
     using namespace stored::xwca;
     VLOG_DEFAULT("Process QVT calibration spectrum");
@@ -129,7 +129,7 @@ bool VantishPlugIn::processQVTSpectrumXwCAT2(CFDataRef& data, Matrices& matrices
     return calib::fill(*this, matrices, sp, false, false);
 }
 
-bool VantishPlugIn::processQVTSpectrumVD6287_XwClv3(CFDataRef& data, Matrices& matrices)
+bool Calibration::processQVTSpectrumVD6287_XwClv3(CFDataRef& data, Matrices& matrices)
 {
     using namespace stored::vd6287;
     VLOG_DEFAULT("Process QVT calibration spectrum");

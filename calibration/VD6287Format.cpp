@@ -2,7 +2,7 @@
 
 #include "support/CFOwned.h"
 #include "calibration/DriverRecords.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 #include "support/Log.h"
 
 #include <optional>
@@ -134,7 +134,7 @@ void putHalf(driver::RecordBuffer& out, size_t at, std::span<const uint8_t> b)
 
 } // namespace
 
-CFDataRef VantishPlugIn::convertSorvelXwClv1Tov3(CFDataRef versionOne)
+CFDataRef Calibration::convertSorvelXwClv1Tov3(CFDataRef versionOne)
 {
     const CFIndex length = versionOne ? CFDataGetLength(versionOne) : 0;
     if (length != CFIndex(kV1Size)) {
@@ -160,7 +160,7 @@ CFDataRef VantishPlugIn::convertSorvelXwClv1Tov3(CFDataRef versionOne)
     return out.createData();
 }
 
-bool VantishPlugIn::processQVTCalibrationVD6287_XwClv3(CFDataRef& data, CFDataRef& record)
+bool Calibration::processQVTCalibrationVD6287_XwClv3(CFDataRef& data, CFDataRef& record)
 {
     const CFIndex length = data ? CFDataGetLength(data) : 0;
     if (length != CFIndex(kV3Size)) {
@@ -198,10 +198,10 @@ bool VantishPlugIn::processQVTCalibrationVD6287_XwClv3(CFDataRef& data, CFDataRe
     if (!built)
         return false;
 
-    numberOfChannels = kChannels;
-    dbChannelCount = kChannels;
-    smallDBVersion = 1.3f;
+    unit_.numberOfChannels = kChannels;
+    unit_.dbChannelCount = kChannels;
+    unit_.smallDBVersion = 1.3f;
     record = built.release();
-    sensorType = eALSSensorTypeVD6287;
+    unit_.sensorType = eALSSensorTypeVD6287;
     return true;
 }

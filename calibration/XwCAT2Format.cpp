@@ -3,7 +3,7 @@
 #include "support/CFOwned.h"
 #include "calibration/ChipId.h"
 #include "calibration/DriverRecords.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 #include "support/Log.h"
 
 #include <Tessary/Tessary.h>
@@ -104,7 +104,7 @@ CFDataRef buildRecord(std::span<const uint8_t> data, const Timing& timing, uint8
 
 } // namespace
 
-bool VantishPlugIn::processQVTCalibrationXwCAT2(CFDataRef& data, CFDataRef& record)
+bool Calibration::processQVTCalibrationXwCAT2(CFDataRef& data, CFDataRef& record)
 {
     const CFIndex length = data ? CFDataGetLength(data) : 0;
     VLOG_DEFAULT("QVT calibration data length = %ld\n", long(length));
@@ -120,10 +120,10 @@ bool VantishPlugIn::processQVTCalibrationXwCAT2(CFDataRef& data, CFDataRef& reco
 
     const uint32_t storedId = storedChipId(bytes);
     VLOG_DEFAULT("Chip_id is 0x%08X", storedId);
-    if (!calib::chipIdMatches(storedId, chipId.load())) {
+    if (!calib::chipIdMatches(storedId, unit_.chipId.load())) {
         VLOG_ERROR("Chip ID doesn't match - (device chip ID 0x%08X != calibration chip ID 0x%08X and chip_id_reversed "
                    "0x%08X)",
-                   chipId.load(), storedId, calib::reversedChipId(storedId));
+                   unit_.chipId.load(), storedId, calib::reversedChipId(storedId));
         return false;
     }
 
@@ -140,9 +140,9 @@ bool VantishPlugIn::processQVTCalibrationXwCAT2(CFDataRef& data, CFDataRef& reco
     CFOwned<CFDataRef> built(buildRecord(bytes, timing, nChannels, nGains));
     if (!built)
         return false;
-    smallDBVersion = 1.3f;
-    numberOfChannels = nChannels;
-    dbChannelCount = nChannels;
+    unit_.smallDBVersion = 1.3f;
+    unit_.numberOfChannels = nChannels;
+    unit_.dbChannelCount = nChannels;
     record = built.release();
     return true;
 }

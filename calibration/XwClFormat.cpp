@@ -2,7 +2,7 @@
 
 #include "calibration/ChipId.h"
 #include "calibration/DriverRecords.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 #include "support/Log.h"
 
 namespace calib {
@@ -132,36 +132,36 @@ bool countsFit(const ChannelRecordLayout& layout, std::span<const uint8_t> e)
     return false;
 }
 
-void applyToPlugIn(VantishPlugIn& p, uint8_t deviceID, uint8_t nChannels, uint8_t chipType)
+void applyToPlugIn(Calibration& p, uint8_t deviceID, uint8_t nChannels, uint8_t chipType)
 {
     switch (deviceID) {
     case kDeviceKestrow:
     case kDeviceMarlit:
-        p.smallDBVersion = 1.3f;
-        p.chipType = chipType;
-        p.numberOfChannels = nChannels;
-        p.dbChannelCount = nChannels;
+        p.unit().smallDBVersion = 1.3f;
+        p.unit().chipType = chipType;
+        p.unit().numberOfChannels = nChannels;
+        p.unit().dbChannelCount = nChannels;
         break;
     case kDeviceFourChannelA:
     case kDeviceFourChannelB:
-        p.algoVersion = 4;
-        p.lambdaConfigured = 1;
-        p.lambda = 0.01f;
-        p.numberOfChannels = nChannels;
-        p.dbChannelCount = nChannels;
+        p.unit().algoVersion = 4;
+        p.fit().lambdaConfigured = 1;
+        p.fit().lambda = 0.01f;
+        p.unit().numberOfChannels = nChannels;
+        p.unit().dbChannelCount = nChannels;
         break;
     case kDeviceSixChannel:
-        p.smallDBVersion = 1.2f;
-        p.chipType = chipType;
-        p.numberOfChannels = nChannels;
-        p.dbChannelCount = nChannels - 1u;
+        p.unit().smallDBVersion = 1.2f;
+        p.unit().chipType = chipType;
+        p.unit().numberOfChannels = nChannels;
+        p.unit().dbChannelCount = nChannels - 1u;
         break;
     }
 }
 
 } // namespace
 
-XwClParse parseXwClRecord(VantishPlugIn& p, std::span<const uint8_t> data)
+XwClParse parseXwClRecord(Calibration& p, std::span<const uint8_t> data)
 {
     XwClParse result;
     if (data.size() != kOneEntrySize && data.size() != kTwoEntrySize)
@@ -176,14 +176,14 @@ XwClParse parseXwClRecord(VantishPlugIn& p, std::span<const uint8_t> data)
     VLOG_DEBUG("Chip_id = 0x%08X\n", chipID);
     VLOG_INFO("Chip_type = %d\n", int(chipType));
 
-    if (!chipIdMatches(chipID, p.chipId.load())) {
+    if (!chipIdMatches(chipID, p.unit().chipId.load())) {
         VLOG_ERROR("ID in QVT calibration (0x%x) doesn't match with chip ID (0x%x) -> calibration will be skipped.\n",
-                   chipID, p.chipId.load());
-        p.setDbReady(false);
+                   chipID, p.unit().chipId.load());
+        p.databases().setReady(false);
         result.outcome = XwClParse::Outcome::ChipMismatch;
         return result;
     }
-    VLOG_INFO("Found calibration for chip with ID = 0x%x\n", p.chipId.load());
+    VLOG_INFO("Found calibration for chip with ID = 0x%x\n", p.unit().chipId.load());
 
     const Variant* variant = variantFor(deviceID);
     if (!variant)

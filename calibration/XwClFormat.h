@@ -6,7 +6,7 @@
 #include "support/CFOwned.h"
 #include "formats/XwClLayout.h"
 #include "lightdb/LDBMInfo.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -28,6 +28,6 @@ struct XwClParse {
 
 // Parses an XwCl record (the caller has recognised its length) into the
 // driver record and sets the plug-in's calibration fields.
-XwClParse parseXwClRecord(VantishPlugIn& plugin, std::span<const uint8_t> data);
+XwClParse parseXwClRecord(Calibration& calibration, std::span<const uint8_t> data);
 
 } // namespace calib

@@ -136,10 +136,10 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
         VPServicePublishProperty(service, CFSTR("SysConfigCalibration"), kCFBooleanTrue);
     {
         fz::PlugIn plugin;
-        plugin->service = service;
-        plugin->numberOfChannels = dbChannels;
-        plugin->dbChannelCount = dbChannels;
-        plugin->publishDatabase(fz::smallDatabase(dbChannels), true);
+        parts(*plugin).service() = service;
+        parts(*plugin).unit().numberOfChannels = dbChannels;
+        parts(*plugin).unit().dbChannelCount = dbChannels;
+        parts(*plugin).databases().publish(fz::smallDatabase(dbChannels), true);
 
         for (int call = 0; call < kMaxCalls && in.size() > 0; ++call) {
             CFOwned<CFStringRef> k(key(in));

@@ -33,9 +33,9 @@ std::vector<uint8_t> fitted(std::span<const uint8_t> payload, size_t size)
 // Channel columns as the per-chip build asks for them.
 void prepareColumns(VantishPlugIn& p, Matrices& m)
 {
-    const uint32_t chipType = p.chipType.load();
-    const uint32_t rows = p.dbChannelCount.load();
-    m.nChannels = int32_t(chipType == 1 || chipType == 2 ? rows : p.numberOfChannels.load());
+    const uint32_t chipType = parts(p).unit().chipType.load();
+    const uint32_t rows = parts(p).unit().dbChannelCount.load();
+    m.nChannels = int32_t(chipType == 1 || chipType == 2 ? rows : parts(p).unit().numberOfChannels.load());
 }
 
 void checkExtracted(VantishPlugIn& p, const Matrices& m, bool extracted)
@@ -44,8 +44,8 @@ void checkExtracted(VantishPlugIn& p, const Matrices& m, bool extracted)
         return;
     // What the reference scan relies on: whole spectra for every column and
     // a weight for every sensor channel.
-    if (m.nChannels < 1 || m.channelSpectra.size() != size_t(m.nChannels) * p.spectrumSampleCount.load() ||
-        m.channelWeights.size() != p.numberOfChannels.load())
+    if (m.nChannels < 1 || m.channelSpectra.size() != size_t(m.nChannels) * parts(p).unit().spectrumSampleCount.load() ||
+        m.channelWeights.size() != parts(p).unit().numberOfChannels.load())
         std::abort();
 }
 
@@ -53,12 +53,12 @@ void parseXwCAT2(VantishPlugIn& p, CFDataRef data)
 {
     CFDataRef input = data;
     CFDataRef record = nullptr;
-    if (!p.processQVTCalibrationXwCAT2(input, record))
+    if (!parts(p).calibration().processQVTCalibrationXwCAT2(input, record))
         return;
     CFOwned<CFDataRef> owned(record);
     Matrices m;
     prepareColumns(p, m);
-    checkExtracted(p, m, p.processQVTSpectrumXwCAT2(input, m));
+    checkExtracted(p, m, parts(p).calibration().processQVTSpectrumXwCAT2(input, m));
 }
 
 void parseXwCl(VantishPlugIn& p, CFDataRef data)
@@ -78,17 +78,17 @@ void parseVD6287v3(VantishPlugIn& p, CFDataRef data)
 {
     CFDataRef input = data;
     CFDataRef record = nullptr;
-    if (!p.processQVTCalibrationVD6287_XwClv3(input, record))
+    if (!parts(p).calibration().processQVTCalibrationVD6287_XwClv3(input, record))
         return;
     CFOwned<CFDataRef> owned(record);
     Matrices m;
     prepareColumns(p, m);
-    checkExtracted(p, m, p.processQVTSpectrumVD6287_XwClv3(input, m));
+    checkExtracted(p, m, parts(p).calibration().processQVTSpectrumVD6287_XwClv3(input, m));
 }
 
 void parseVD6287v1(VantishPlugIn& p, CFDataRef data)
 {
-    CFOwned<CFDataRef> converted(p.convertSorvelXwClv1Tov3(data));
+    CFOwned<CFDataRef> converted(parts(p).calibration().convertSorvelXwClv1Tov3(data));
     if (!converted)
         return;
     if (CFDataGetLength(converted.get()) != CFIndex(stored::vd6287::kV3Size))
@@ -106,8 +106,8 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
     const uint8_t chipType = input.take<uint8_t>();
 
     fz::PlugIn plugin;
-    plugin->chipId = fz::kChipId;
-    plugin->chipType = chipType % 4;
+    parts(*plugin).unit().chipId = fz::kChipId;
+    parts(*plugin).unit().chipType = chipType % 4;
 
     std::vector<uint8_t> bytes;
     switch (layout) {

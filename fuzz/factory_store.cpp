@@ -90,7 +90,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
         plugin->open(service, 0);
         fz::runQueuedWork();
         if (flags & kLoadAgain)
-            plugin->loadQVTCalibration(false);
+            parts(*plugin).calibration().loadQVTCalibration(false);
         if (flags & kClientRebuild)
             plugin->setPropertyForClient(CFSTR("RebuildVelderDB"), kCFBooleanTrue, nullptr);
     }

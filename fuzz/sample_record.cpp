@@ -64,23 +64,23 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
     const uint8_t mitigationType = input.take<uint8_t>();
 
     fz::PlugIn plugin;
-    plugin->numberOfChannels = channels;
-    plugin->dbChannelCount = dbChannels;
-    plugin->sensorType = sensorType;
-    plugin->chipType = chipType;
-    plugin->mitigationType = mitigationType;
-    plugin->channelRatioMitigation = (flags & kMitigation) != 0;
-    plugin->rgbcOverrideActive = (flags & kRGBCOverride) != 0;
-    for (auto& value : plugin->rgbcOverride)
+    parts(*plugin).unit().numberOfChannels = channels;
+    parts(*plugin).unit().dbChannelCount = dbChannels;
+    parts(*plugin).unit().sensorType = sensorType;
+    parts(*plugin).unit().chipType = chipType;
+    parts(*plugin).unit().mitigationType = mitigationType;
+    parts(*plugin).unit().channelRatioMitigation = (flags & kMitigation) != 0;
+    parts(*plugin).overrides().rgbcOverrideActive = (flags & kRGBCOverride) != 0;
+    for (auto& value : parts(*plugin).overrides().rgbcOverride)
         value = input.take<uint32_t>();
-    plugin->chromaticityOverrideActive = (flags & kChromaticityOverride) != 0;
-    plugin->overrideX = input.take<double>();
-    plugin->overrideY = input.take<double>();
-    plugin->overrideLuminance = input.take<double>();
-    plugin->lambdaConfigured = (flags & kLambda) != 0;
-    plugin->lambda = input.take<float>();
+    parts(*plugin).overrides().chromaticityOverrideActive = (flags & kChromaticityOverride) != 0;
+    parts(*plugin).overrides().overrideX = input.take<double>();
+    parts(*plugin).overrides().overrideY = input.take<double>();
+    parts(*plugin).overrides().overrideLuminance = input.take<double>();
+    parts(*plugin).fit().lambdaConfigured = (flags & kLambda) != 0;
+    parts(*plugin).fit().lambda = input.take<float>();
     const uint64_t timeStamp = input.take<uint64_t>();
-    plugin->publishDatabase(fz::smallDatabase(dbChannels, flags & kNormalised), !(flags & kNotReady));
+    parts(*plugin).databases().publish(fz::smallDatabase(dbChannels, flags & kNormalised), !(flags & kNotReady));
 
     const bool als = !(flags & kNotALS);
     const bool withRecord = !(flags & kNoRecord);

@@ -73,21 +73,21 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
     IOHIDServiceRef service = VPServiceCreate(kRegistryID);
     {
         fz::PlugIn plugin;
-        plugin->service = service;
-        plugin->registryEntry =
+        parts(*plugin).service() = service;
+        parts(*plugin).registryEntry() =
             IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(kRegistryID));
-        plugin->orientation = orientation;
-        plugin->numberOfChannels = channels;
-        plugin->dbChannelCount = channels;
-        plugin->colorAlgoOverride = (flags & kAlgoOverride) ? 5 : 0;
+        parts(*plugin).unit().orientation = orientation;
+        parts(*plugin).unit().numberOfChannels = channels;
+        parts(*plugin).unit().dbChannelCount = channels;
+        parts(*plugin).unit().colorAlgoOverride = (flags & kAlgoOverride) ? 5 : 0;
 
         const bool async = flags & kAsyncCreate;
         const bool push = flags & kPushCalibration;
         const bool database = flags & kProcessDatabase;
-        plugin->processSysConfigCalibration(async, push, database);
+        processSysConfigCalibration(parts(*plugin).calibration(), async, push, database);
         fz::runQueuedWork();
         if (flags & kCalibrateTwice)
-            plugin->processSysConfigCalibration(async, push, database);
+            processSysConfigCalibration(parts(*plugin).calibration(), async, push, database);
     }
     CFRelease(service);
     VPRegistryReset();

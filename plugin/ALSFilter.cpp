@@ -22,6 +22,16 @@ namespace {
 
 using XYZ = std::array<float, 3>;
 
+// What the filter reads and writes of the instance, part by part.
+struct EventParts {
+    const UnitConfiguration& unit;
+    const FitParameters& fit;
+    const ClientOverrides& overrides;
+    const DatabaseSlot& databases;
+    std::array<std::atomic<float>, 3>& lastXYZ;
+    std::atomic<uint64_t>& shortRecords;
+};
+
 constexpr uint32_t kMaxChannels = 6;
 constexpr double kComparisonThreshold = 0.005; // 0.5 % of our own value
 // A driver that sends short records sends them all the time: log the first
@@ -41,9 +51,9 @@ void writeEventXYZ(IOHIDEventRef event, const XYZ& xyz)
     IOHIDEventSetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace, 1);
 }
 
-void reportShortRecord(VantishPlugIn& plugin, size_t length)
+void reportShortRecord(std::atomic<uint64_t>& shortRecords, size_t length)
 {
-    const uint64_t count = plugin.shortSampleRecords.fetch_add(1) + 1;
+    const uint64_t count = shortRecords.fetch_add(1) + 1;
     if (count % kShortRecordLogInterval == 1)
         VLOG_ERROR("Sample record of %lu bytes is shorter than %lu bytes, event passed unchanged (%llu so far)\n",
                    (unsigned long) length, (unsigned long) ALSSampleRecord::kSize, (unsigned long long) count);
@@ -64,13 +74,13 @@ bool rejectSpike(IOHIDEventRef event, const ALSSampleRecord& record, const Spike
 
 // Replaces the colour input and the record's channels by the client's values
 // and shows them in the event: in the driver's record and the raw channel fields.
-void applyRGBCOverride(VantishPlugIn& plugin, IOHIDEventRef event, ALSSampleRecord& record,
+void applyRGBCOverride(const ClientOverrides& overrides, IOHIDEventRef event, ALSSampleRecord& record,
                        std::span<uint8_t> recordBytes, std::array<float, kMaxChannels>& channel,
                        uint32_t channelCount, uint32_t skip)
 {
     std::array<uint32_t, kMaxChannels> values{};
     for (size_t i = 0; i < values.size(); ++i)
-        values[i] = plugin.rgbcOverride[i].load();
+        values[i] = overrides.rgbcOverride[i].load();
     for (uint32_t i = 0; i < channelCount; ++i) {
         channel[i] = float(values[i]);
         record.channelValues[skip + i] = float(values[i]);
@@ -121,18 +131,19 @@ void logComparisonWithSensor(const ALSSampleRecord& r, const XYZ& xyz)
 // The colour of one sample, scaled to its lux; zero when the sample is a spike
 // or the channel layout cannot be matched with the database. May change the
 // record (clamped channels, client channels) and the event (level, raw fields).
-XYZ sampleColour(VantishPlugIn& plugin, IOHIDEventRef event, const SpectralDatabase& db, ALSSampleRecord& record,
+XYZ sampleColour(const EventParts& parts, IOHIDEventRef event, const SpectralDatabase& db, ALSSampleRecord& record,
                  std::span<uint8_t> recordBytes)
 {
-    const uint32_t sensorChannels = plugin.numberOfChannels.load();
+    const UnitConfiguration& unit = parts.unit;
+    const uint32_t sensorChannels = unit.numberOfChannels.load();
     if (sensorChannels < 4 || sensorChannels > kMaxChannels) {
         VLOG_ERROR("Unknown number of channels (%d) \n", int(sensorChannels));
         return {};
     }
 
-    const uint32_t sensorType = plugin.sensorType.load();
-    const SpikeSettings spikeSettings{plugin.channelRatioMitigation.load() != 0, plugin.mitigationType.load(),
-                                      plugin.chipType.load(), sensorType};
+    const uint32_t sensorType = unit.sensorType.load();
+    const SpikeSettings spikeSettings{unit.channelRatioMitigation.load() != 0, unit.mitigationType.load(),
+                                      unit.chipType.load(), sensorType};
     if (rejectSpike(event, record, spikeSettings))
         return {};
 
@@ -151,13 +162,11 @@ XYZ sampleColour(VantishPlugIn& plugin, IOHIDEventRef event, const SpectralDatab
     for (uint32_t i = 0; i < dbChannels; ++i)
         channel[i] = record.channelValues[skip + i];
 
-    if (plugin.rgbcOverrideActive.load())
-        applyRGBCOverride(plugin, event, record, recordBytes, channel, dbChannels, skip);
+    if (parts.overrides.rgbcOverrideActive.load())
+        applyRGBCOverride(parts.overrides, event, record, recordBytes, channel, dbChannels, skip);
 
     XYZ xyz{};
-    const FitSettings fit{plugin.weightExponent.load(), plugin.weightOffset.load(), plugin.lambda.load(),
-                          plugin.lambdaConfigured.load() != 0};
-    colourCalculationDynamic(db, fit, channel.data(), xyz.data(), int(dbChannels));
+    colourCalculationDynamic(db, parts.fit.settings(), channel.data(), xyz.data(), int(dbChannels));
     if (sensorType != eALSSensorTypeVD6287)
         logSample(record, xyz);
 
@@ -167,9 +176,9 @@ XYZ sampleColour(VantishPlugIn& plugin, IOHIDEventRef event, const SpectralDatab
     return xyz;
 }
 
-void filterALSEvent(VantishPlugIn& plugin, IOHIDEventRef event)
+void filterALSEvent(const EventParts& parts, IOHIDEventRef event)
 {
-    if (const auto override = ChromaticityOverride::active(plugin)) {
+    if (const auto override = ChromaticityOverride::active(parts.overrides)) {
         applyChromaticityOverride(event, *override);
         return;
     }
@@ -179,17 +188,17 @@ void filterALSEvent(VantishPlugIn& plugin, IOHIDEventRef event)
         return;
     auto record = ALSSampleRecord::decode(recordBytes);
     if (!record) {
-        reportShortRecord(plugin, recordBytes.size());
+        reportShortRecord(parts.shortRecords, recordBytes.size());
         return;
     }
 
-    const VantishPlugIn::DatabaseSnapshot snapshot = plugin.snapshotDatabase();
+    const DatabaseSlot::Snapshot snapshot = parts.databases.snapshot();
     if (!snapshot.ready || !snapshot.db)
         return;
 
-    const XYZ xyz = sampleColour(plugin, event, *snapshot.db, *record, recordBytes);
+    const XYZ xyz = sampleColour(parts, event, *snapshot.db, *record, recordBytes);
     for (size_t i = 0; i < xyz.size(); ++i)
-        plugin.lastXYZ[i].store(xyz[i]);
+        parts.lastXYZ[i].store(xyz[i]);
     if (record->xyzInRecord)
         ALSSampleRecord::writeXYZResult(recordBytes, xyz);
     else
@@ -201,7 +210,7 @@ void filterALSEvent(VantishPlugIn& plugin, IOHIDEventRef event)
 IOHIDEventRef VantishPlugIn::filter(IOHIDEventRef event, bool isCopyEvent)
 {
     if (isALSEvent(event))
-        filterALSEvent(*this, event);
+        filterALSEvent({unit_, fit_, overrides_, databases_, lastXYZ_, shortSampleRecords_}, event);
     logALSSample(event, isCopyEvent);
     return event;
 }

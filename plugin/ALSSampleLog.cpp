@@ -55,14 +55,14 @@ void logShortLine(IOHIDEventRef event, double seconds, double lux, std::pair<flo
 
 void VantishPlugIn::logALSSample(IOHIDEventRef event, bool isCopyEvent)
 {
-    if (sensorType.load() != eALSSensorTypeVD6287 || !event ||
+    if (unit_.sensorType.load() != eALSSensorTypeVD6287 || !event ||
         IOHIDEventGetType(event) != kIOHIDEventTypeAmbientLightSensor)
         return;
     // Nothing below is worth computing when the line would not be written.
     if (!os_log_type_enabled(vantishLog(), OS_LOG_TYPE_DEFAULT))
         return;
 
-    const double seconds = double(IOHIDEventGetTimeStamp(event)) * machTimeToSeconds;
+    const double seconds = double(IOHIDEventGetTimeStamp(event)) * machTimeToSeconds_;
     const double lux = IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightSensorIlluminance);
     const auto xy = eventChromaticity(event);
 

@@ -1,15 +1,15 @@
 #include "plugin/ChromaticityOverride.h"
 
-#include "plugin/VantishPlugIn.h"
+#include "plugin/ClientOverrides.h"
 
-std::optional<ChromaticityOverride> ChromaticityOverride::active(const VantishPlugIn& plugin)
+std::optional<ChromaticityOverride> ChromaticityOverride::active(const ClientOverrides& overrides)
 {
-    if (!plugin.chromaticityOverrideActive.load())
+    if (!overrides.chromaticityOverrideActive.load())
         return std::nullopt;
-    const double y = plugin.overrideY.load();
+    const double y = overrides.overrideY.load();
     if (!(y > 0.0))
         return std::nullopt;
-    return ChromaticityOverride{plugin.overrideX.load(), y, plugin.overrideLuminance.load()};
+    return ChromaticityOverride{overrides.overrideX.load(), y, overrides.overrideLuminance.load()};
 }
 
 std::array<float, 3> chromaticityToXYZ(double x, double y, double luminance)

@@ -8,15 +8,15 @@
 #include <array>
 #include <optional>
 
-class VantishPlugIn;
+struct ClientOverrides;
 
 struct ChromaticityOverride {
     double x = 0.0;
     double y = 0.0;
     double luminance = -1.0; // negative: keep the event's own illuminance
 
-    // The plug-in's override when a client has turned it on with a y above 0.
-    static std::optional<ChromaticityOverride> active(const VantishPlugIn& plugin);
+    // The clients' override when one has turned it on with a y above 0.
+    static std::optional<ChromaticityOverride> active(const ClientOverrides& overrides);
 };
 
 // X, Y, Z of chromaticity (x, y) at luminance Y, each rounded to float.

@@ -4,6 +4,7 @@
 #include "support/CFTypes.h"
 #include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
+#include "sysconfig/SysConfigCalibration.h"
 
 #include <algorithm>
 #include <mutex>
@@ -31,7 +32,7 @@ const char* onOff(bool on) { return on ? "on" : "off"; }
 
 // A number switches the override on or off, keeping its values; an array of
 // one value per database channel sets them and switches it on.
-void setRGBCOverride(VantishPlugIn& p, CFTypeRef value)
+void setRGBCOverride(ClientOverrides& p, const UnitConfiguration& unit, CFTypeRef value)
 {
     if (const auto on = intValue(value)) {
         p.rgbcOverrideActive = *on != 0;
@@ -39,7 +40,7 @@ void setRGBCOverride(VantishPlugIn& p, CFTypeRef value)
         return;
     }
     CFArrayRef array = asArray(value);
-    if (!array || CFArrayGetCount(array) != CFIndex(p.dbChannelCount.load()))
+    if (!array || CFArrayGetCount(array) != CFIndex(unit.dbChannelCount.load()))
         return;
     p.rgbcOverrideActive = 1;
     // The override holds six channels; a longer array has nowhere to go.
@@ -56,7 +57,7 @@ void setRGBCOverride(VantishPlugIn& p, CFTypeRef value)
 // A number switches the override on or off; an array sets x and y, and the
 // luminance Y when it has a third element (without one, the event's own
 // illuminance is kept).
-void setChromaticityOverride(VantishPlugIn& p, CFTypeRef value)
+void setChromaticityOverride(ClientOverrides& p, CFTypeRef value)
 {
     if (const auto on = intValue(value)) {
         p.chromaticityOverrideActive = *on != 0;
@@ -84,7 +85,7 @@ void setChromaticityOverride(VantishPlugIn& p, CFTypeRef value)
     }
 }
 
-void setLambda(VantishPlugIn& p, CFTypeRef value)
+void setLambda(FitParameters& p, CFTypeRef value)
 {
     if (!isNumber(value))
         return;
@@ -94,7 +95,7 @@ void setLambda(VantishPlugIn& p, CFTypeRef value)
     VLOG_DEFAULT("Setting lambda %f.", double(v));
 }
 
-void setMitigationType(VantishPlugIn& p, CFTypeRef value)
+void setMitigationType(UnitConfiguration& p, CFTypeRef value)
 {
     const auto type = intValue(value);
     if (!type)
@@ -105,25 +106,26 @@ void setMitigationType(VantishPlugIn& p, CFTypeRef value)
 
 // Reruns the calibration the service asks for, on the caller's thread, with a
 // forced rebuild of the per-chip database.
-void rebuildDatabases(VantishPlugIn& p)
+void rebuildDatabases(Calibration& calibration, IOHIDServiceRef service)
 {
     VLOG_INFO("Rebuild databases.");
-    CFTypeRef sysConfig = p.service ? IOHIDServiceGetProperty(p.service, CFSTR("SysConfigCalibration")) : nullptr;
+    CFTypeRef sysConfig = service ? IOHIDServiceGetProperty(service, CFSTR("SysConfigCalibration")) : nullptr;
     bool useSysConfig = false;
     if (sysConfig && CFGetTypeID(sysConfig) == CFBooleanGetTypeID()) {
         useSysConfig = CFBooleanGetValue(static_cast<CFBooleanRef>(sysConfig));
         VLOG_INFO("%s sysconfig calibration to calibrate sensor\n", useSysConfig ? "Use" : "Don't use");
     }
-    if (!useSysConfig && p.service)
-        useSysConfig = IOHIDServiceGetProperty(p.service, CFSTR("ALSCalibrationSpectrumToProcess")) == kCFBooleanTrue;
+    if (!useSysConfig && service)
+        useSysConfig = IOHIDServiceGetProperty(service, CFSTR("ALSCalibrationSpectrumToProcess")) == kCFBooleanTrue;
 
     // The factory path reports whether the driver got its record; a rebuild
     // has only succeeded when a new database has been published as well. The
     // lock keeps queued calibration from publishing one in between.
-    std::lock_guard lock(p.calibrationMutex);
-    const SpectralDatabasePtr before = p.snapshotDatabase().db;
-    const bool called = useSysConfig ? p.processSysConfigCalibration(false, false, true) : p.loadQVTCalibration(true);
-    const bool rebuilt = called && p.snapshotDatabase().db != before;
+    const auto guard = calibration.lock();
+    const SpectralDatabasePtr before = calibration.databases().snapshot().db;
+    const bool called = useSysConfig ? processSysConfigCalibration(calibration, false, false, true)
+                                     : calibration.loadQVTCalibration(true);
+    const bool rebuilt = called && calibration.databases().snapshot().db != before;
     if (rebuilt)
         VLOG_INFO("Databases were rebuilt successfully.");
     else
@@ -138,13 +140,13 @@ void VantishPlugIn::setPropertyForClient(CFStringRef key, CFTypeRef value, CFTyp
     if (!key)
         return;
     if (CFEqual(key, CFSTR("RGBCOverride")))
-        setRGBCOverride(*this, value);
+        setRGBCOverride(overrides_, unit_, value);
     else if (CFEqual(key, CFSTR("ChromaticityOverride")))
-        setChromaticityOverride(*this, value);
+        setChromaticityOverride(overrides_, value);
     else if (CFEqual(key, CFSTR("ColorAlgoLambda")))
-        setLambda(*this, value);
+        setLambda(fit_, value);
     else if (CFEqual(key, CFSTR("ChannelRatioMitigationType")))
-        setMitigationType(*this, value);
+        setMitigationType(unit_, value);
     else if (CFEqual(key, CFSTR("RebuildVelderDB")))
-        rebuildDatabases(*this);
+        rebuildDatabases(calibration_, service_);
 }

@@ -10,7 +10,8 @@ namespace {
 
 // Fills an ALS event's colour from the last result when it has none, applies
 // the chromaticity override, and logs what the client gets.
-void fillCopiedColour(VantishPlugIn& plugin, IOHIDEventRef event)
+void fillCopiedColour(const std::array<std::atomic<float>, 3>& lastXYZ, const ClientOverrides& overrides,
+                      IOHIDEventRef event)
 {
     std::array<float, 3> xyz{};
     long colourSpace = long(IOHIDEventGetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace));
@@ -19,14 +20,14 @@ void fillCopiedColour(VantishPlugIn& plugin, IOHIDEventRef event)
                float(IOHIDEventGetFloatValue(event, kIOHIDEventFieldAmbientLightColorComponent1)),
                float(IOHIDEventGetFloatValue(event, kIOHIDEventFieldAmbientLightColorComponent2))};
     } else {
-        xyz = {plugin.lastXYZ[0].load(), plugin.lastXYZ[1].load(), plugin.lastXYZ[2].load()};
+        xyz = {lastXYZ[0].load(), lastXYZ[1].load(), lastXYZ[2].load()};
         IOHIDEventSetFloatValue(event, kIOHIDEventFieldAmbientLightColorComponent0, xyz[0]);
         IOHIDEventSetFloatValue(event, kIOHIDEventFieldAmbientLightColorComponent1, xyz[1]);
         IOHIDEventSetFloatValue(event, kIOHIDEventFieldAmbientLightColorComponent2, xyz[2]);
         IOHIDEventSetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace, 1);
         colourSpace = 1;
     }
-    if (const auto override = ChromaticityOverride::active(plugin))
+    if (const auto override = ChromaticityOverride::active(overrides))
         xyz = applyChromaticityOverride(event, *override);
     VLOG_INFO("Copy event with color = [%f, %f, %f], color space = %ld", double(xyz[0]), double(xyz[1]),
               double(xyz[2]), colourSpace);
@@ -37,14 +38,14 @@ void fillCopiedColour(VantishPlugIn& plugin, IOHIDEventRef event)
 IOHIDEventRef VantishPlugIn::filterCopyEvent(IOHIDEventRef event)
 {
     // This sensor's copies carry their own sample record: filter them whole.
-    if (sensorType == eALSSensorTypeVD6287) {
+    if (unit_.sensorType == eALSSensorTypeVD6287) {
         filter(event, true);
         return event;
     }
     if (!event)
         VLOG_ERROR("Event is null");
-    else if (IOHIDEventGetType(event) == kIOHIDEventTypeAmbientLightSensor && isDbReady())
-        fillCopiedColour(*this, event);
+    else if (IOHIDEventGetType(event) == kIOHIDEventTypeAmbientLightSensor && databases_.isReady())
+        fillCopiedColour(lastXYZ_, overrides_, event);
     logALSSample(event, true);
     return event;
 }

@@ -5,6 +5,7 @@
 #include "support/LittleEndian.h"
 #include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
+#include "sysconfig/SysConfigCalibration.h"
 
 #include <Tessary/Tessary.h>
 
@@ -54,37 +55,37 @@ void VantishPlugIn::open(IOHIDServiceRef openedService, IOOptionBits options)
     }
 
     // 2. Configuration members start afresh.
-    orientation = 1;
-    service = openedService;
-    algoVersion = 0;
-    smallDBVersion = 1.1f;
-    setDbReady(false);
-    numberOfChannels = 0;
-    dbChannelCount = 0;
-    spectrumSampleCount = 0;
-    weightExponent = 2.0f;
-    weightOffset = 0.00001f;
-    channelRatioMitigation = 0;
-    mitigationType = 0;
-    chipType = 0;
-    deviceColor = 0;
-    isDravikOS = 0;
-    qvtRetryCount = 0;
+    unit_.orientation = 1;
+    service_ = openedService;
+    unit_.algoVersion = 0;
+    unit_.smallDBVersion = 1.1f;
+    databases_.setReady(false);
+    unit_.numberOfChannels = 0;
+    unit_.dbChannelCount = 0;
+    unit_.spectrumSampleCount = 0;
+    fit_.weightExponent = 2.0f;
+    fit_.weightOffset = 0.00001f;
+    unit_.channelRatioMitigation = 0;
+    unit_.mitigationType = 0;
+    unit_.chipType = 0;
+    unit_.deviceColor = 0;
+    unit_.isDravikOS = 0;
+    calibration_.resetForOpen();
 
     // 3. Device information.
     if (CFTypeRef product = QyCopyAnswer(CFSTR("ProductName"), nullptr)) {
         if (answerEquals(product, CFSTR("Dravik OS"))) {
-            isDravikOS = 1;
+            unit_.isDravikOS = 1;
             VLOG_DEFAULT("Plugin is opening on Dravik OS.");
         }
         CFRelease(product);
     }
     if (CFTypeRef color = QyCopyAnswer(CFSTR("DeviceColor"), nullptr)) {
         if (answerEquals(color, CFSTR("1")))
-            deviceColor = 1;
+            unit_.deviceColor = 1;
         else if (answerEquals(color, CFSTR("2")))
-            deviceColor = 2;
-        VLOG_INFO("DeviceColor is %d", int(deviceColor.load()));
+            unit_.deviceColor = 2;
+        VLOG_INFO("DeviceColor is %d", int(unit_.deviceColor.load()));
         CFRelease(color);
     }
 
@@ -94,34 +95,34 @@ void VantishPlugIn::open(IOHIDServiceRef openedService, IOOptionBits options)
         CFNumberGetValue(static_cast<CFNumberRef>(id), kCFNumberSInt64Type, &registryID);
     if (registryID != 0) {
         io_service_t entry = IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(uint64_t(registryID)));
-        if (registryEntry && registryEntry != entry)
-            IOObjectRelease(registryEntry);
-        registryEntry = entry;
+        if (registryEntry_ && registryEntry_ != entry)
+            IOObjectRelease(registryEntry_);
+        registryEntry_ = entry;
     }
 
     // 5. Device-tree configuration.
-    if (registryEntry) {
-        if (CFTypeRef value = copyDeviceTreeProperty(registryEntry, CFSTR("IOHIDOrientationType"))) {
+    if (registryEntry_) {
+        if (CFTypeRef value = copyDeviceTreeProperty(registryEntry_, CFSTR("IOHIDOrientationType"))) {
             // Shorter data than a 32-bit value is not an orientation; keep the default.
             if (isData(value))
                 if (auto v = le::read<uint32_t>(bytesOf(value), 0))
-                    orientation = *v;
+                    unit_.orientation = *v;
             CFRelease(value);
         }
-        if (CFTypeRef value = copyDeviceTreeProperty(registryEntry, CFSTR("color-algo-override"))) {
+        if (CFTypeRef value = copyDeviceTreeProperty(registryEntry_, CFSTR("color-algo-override"))) {
             if (isData(value) && bytesOf(value).size() == 4) {
-                colorAlgoOverride = bytesOf(value)[0];
-                VLOG_INFO("Color algo override version = %hhu from EDT\n", colorAlgoOverride.load());
+                unit_.colorAlgoOverride = bytesOf(value)[0];
+                VLOG_INFO("Color algo override version = %hhu from EDT\n", unit_.colorAlgoOverride.load());
             }
             CFRelease(value);
         }
-        if (CFTypeRef value = copyDeviceTreeProperty(registryEntry, CFSTR("color-algo-lambda"))) {
+        if (CFTypeRef value = copyDeviceTreeProperty(registryEntry_, CFSTR("color-algo-lambda"))) {
             if (isData(value) && bytesOf(value).size() == 4) {
                 const uint32_t v = le::get<uint32_t>(bytesOf(value), 0);
                 if (v != 0) {
-                    lambda = float(v / 100.0);
-                    lambdaConfigured = 1;
-                    VLOG_INFO("Setting color algo lambda = %f from EDT\n", double(lambda.load()));
+                    fit_.lambda = float(v / 100.0);
+                    fit_.lambdaConfigured = 1;
+                    VLOG_INFO("Setting color algo lambda = %f from EDT\n", double(fit_.lambda.load()));
                 }
             }
             CFRelease(value);
@@ -130,29 +131,29 @@ void VantishPlugIn::open(IOHIDServiceRef openedService, IOOptionBits options)
 
     // 6. Service configuration.
     if (auto channels = serviceInt(openedService, CFSTR("NumberOfChannels"))) {
-        numberOfChannels = uint32_t(*channels);
-        dbChannelCount = *channels == 6 ? 5u : uint32_t(*channels);
+        unit_.numberOfChannels = uint32_t(*channels);
+        unit_.dbChannelCount = *channels == 6 ? 5u : uint32_t(*channels);
     }
     if (CFTypeRef value = IOHIDServiceGetProperty(openedService, CFSTR("color-algo-lambda")); isNumber(value)) {
         float v = 0.0f;
         CFNumberGetValue(static_cast<CFNumberRef>(value), kCFNumberFloatType, &v);
-        lambda = v;
-        lambdaConfigured = 1;
+        fit_.lambda = v;
+        fit_.lambdaConfigured = 1;
         VLOG_INFO("Setting color algo lambda = %f from EDT\n", double(v));
     }
     if (auto mitigation = serviceInt(openedService, CFSTR("ChannelRatioMitigation"))) {
-        mitigationType = uint32_t(*mitigation);
-        channelRatioMitigation = *mitigation != 0;
+        unit_.mitigationType = uint32_t(*mitigation);
+        unit_.channelRatioMitigation = *mitigation != 0;
         VLOG_INFO("Use channel ratio mitigation - %s, type = %d\n", *mitigation != 0 ? "YES" : "NO", *mitigation);
     }
-    chipId = 0;
+    unit_.chipId = 0;
     if (auto id = serviceInt(openedService, CFSTR("chip_id"))) {
-        chipId = uint32_t(*id);
+        unit_.chipId = uint32_t(*id);
         VLOG_INFO("ChipID is 0x%x\n", unsigned(*id));
     }
-    sensorType = 0;
+    unit_.sensorType = 0;
     if (auto type = serviceInt(openedService, CFSTR("ALSSensorType"))) {
-        sensorType = uint32_t(*type);
+        unit_.sensorType = uint32_t(*type);
         VLOG_INFO("Found sensor type = %d\n", *type);
     }
 
@@ -168,9 +169,9 @@ void VantishPlugIn::open(IOHIDServiceRef openedService, IOOptionBits options)
 
     dispatch_queue_t queue = dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_HIGH, 0);
     if (sysConfig)
-        dispatchRetained(queue, [this] { processSysConfigCalibration(true, true, true); });
+        host_.dispatchRetained(queue, [this] { processSysConfigCalibration(calibration_, true, true, true); });
     else if (spectrumToProcess)
-        dispatchRetained(queue, [this] { processSysConfigCalibration(true, false, true); });
+        host_.dispatchRetained(queue, [this] { processSysConfigCalibration(calibration_, true, false, true); });
     else
-        dispatchRetained(queue, [this] { runCalibrationBringUp(); });
+        host_.dispatchRetained(queue, [this] { calibration_.runCalibrationBringUp(); });
 }

@@ -1,6 +1,6 @@
 #include "plugin/SpikeDetector.h"
 
-#include "plugin/VantishPlugIn.h"
+#include "formats/ALSSensorType.h"
 
 namespace {
 

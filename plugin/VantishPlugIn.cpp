@@ -3,6 +3,7 @@
 // queued work that keeps the instance alive.
 #include "plugin/VantishPlugIn.h"
 
+#include "support/Assert.h"
 #include "support/Log.h"
 
 #include <mach/mach_time.h>
@@ -52,35 +53,24 @@ extern "C" void* VantishPlugInFactory(CFAllocatorRef allocator, CFUUIDRef typeID
 }
 
 VantishPlugIn::VantishPlugIn(CFUUIDRef factory)
-    : interfaceTable(&sVantishPlugInFtbl), factoryID(static_cast<CFUUIDRef>(CFRetain(factory))), refCount(1)
+    : interfaceTable_(&sVantishPlugInFtbl), factoryID_(static_cast<CFUUIDRef>(CFRetain(factory))), refCount_(1)
 {
-    rgbcOverrideActive = 0;
-    chromaticityOverrideActive = 0;
-    lambdaConfigured = 0;
-    lambda = 0.0f;
-    registryEntry = 0;
-    colorAlgoOverride = 0;
-    CFPlugInAddInstanceForFactory(factoryID);
-    for (auto& value : rgbcOverride)
-        value = 0;
-    overrideX = 0.0;
-    overrideY = 0.0;
-    overrideLuminance = 0.0;
-    for (auto& value : lastXYZ)
-        value = 0.0f;
+    // The host calls the table through the instance pointer.
+    VANTISH_ASSERT(static_cast<void*>(this) == static_cast<void*>(&interfaceTable_));
+    CFPlugInAddInstanceForFactory(factoryID_);
     pluginLog = os_log_create(VANTISH_PLUGIN_LOG_SUBSYSTEM, "default");
     mach_timebase_info_data_t timebase{};
     mach_timebase_info(&timebase);
-    machTimeToSeconds = double(timebase.numer) / double(timebase.denom) * 1e-9;
+    machTimeToSeconds_ = double(timebase.numer) / double(timebase.denom) * 1e-9;
 }
 
 VantishPlugIn::~VantishPlugIn()
 {
     // The registry handle taken in open is ours; give it back with the instance.
-    if (registryEntry)
-        IOObjectRelease(registryEntry);
-    CFPlugInRemoveInstanceForFactory(factoryID);
-    CFRelease(factoryID);
+    if (registryEntry_)
+        IOObjectRelease(registryEntry_);
+    CFPlugInRemoveInstanceForFactory(factoryID_);
+    CFRelease(factoryID_);
 }
 
 // ---- COM entry points -------------------------------------------------------
@@ -105,14 +95,14 @@ HRESULT VantishPlugIn::QueryInterface(REFIID iid, LPVOID* out)
     return result;
 }
 
-ULONG VantishPlugIn::AddRef() { return refCount.fetch_add(1) + 1; }
+ULONG VantishPlugIn::AddRef() { return refCount_.fetch_add(1) + 1; }
 
 ULONG VantishPlugIn::Release()
 {
-    const ULONG count = refCount.fetch_sub(1) - 1;
+    const ULONG count = refCount_.fetch_sub(1) - 1;
     if (count == 0) {
         // The database (and with it its arrays) goes once the last reader lets go.
-        databases.clear();
+        databases_.clear();
         this->~VantishPlugIn();
         CFAllocatorDeallocate(kCFAllocatorDefault, this);
     }
@@ -137,41 +127,34 @@ void VantishPlugIn::setPropertyForClient(void* p, CFStringRef key, CFTypeRef val
     self(p)->setPropertyForClient(key, value, client);
 }
 
-// ---- Publication of the per-chip database -------------------------------------------
-
-void VantishPlugIn::publishDatabase(SpectralDatabasePtr db, bool ready) { databases.publish(std::move(db), ready); }
-
-void VantishPlugIn::setDbReady(bool ready) { databases.setReady(ready); }
-
-VantishPlugIn::DatabaseSnapshot VantishPlugIn::snapshotDatabase() const { return databases.snapshot(); }
-
-bool VantishPlugIn::isDbReady() const { return databases.isReady(); }
-
 // ---- Queued work ---------------------------------------------------------------------
 
 // Queued work holds the instance and the service it calibrates: the host may
 // let go of both before the work runs (a store retry can wait 100 seconds).
 
-void VantishPlugIn::dispatchRetained(dispatch_queue_t queue, std::function<void()> work)
+void VantishPlugIn::Host::dispatchRetained(dispatch_queue_t queue, std::function<void()> work)
 {
-    AddRef();
-    CFTypeRef heldService = service ? CFRetain(service) : nullptr;
-    dispatch_async(queue, [this, heldService, work = std::move(work)] {
+    VantishPlugIn* plugin = &plugin_;
+    plugin->AddRef();
+    CFTypeRef heldService = plugin->service_ ? CFRetain(plugin->service_) : nullptr;
+    dispatch_async(queue, [plugin, heldService, work = std::move(work)] {
         work();
         if (heldService)
             CFRelease(heldService);
-        Release();
+        plugin->Release();
     });
 }
 
-void VantishPlugIn::dispatchAfterRetained(dispatch_time_t when, dispatch_queue_t queue, std::function<void()> work)
+void VantishPlugIn::Host::dispatchAfterRetained(dispatch_time_t when, dispatch_queue_t queue,
+                                                std::function<void()> work)
 {
-    AddRef();
-    CFTypeRef heldService = service ? CFRetain(service) : nullptr;
-    dispatch_after(when, queue, [this, heldService, work = std::move(work)] {
+    VantishPlugIn* plugin = &plugin_;
+    plugin->AddRef();
+    CFTypeRef heldService = plugin->service_ ? CFRetain(plugin->service_) : nullptr;
+    dispatch_after(when, queue, [plugin, heldService, work = std::move(work)] {
         work();
         if (heldService)
             CFRelease(heldService);
-        Release();
+        plugin->Release();
     });
 }

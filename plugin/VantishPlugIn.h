@@ -3,18 +3,26 @@
 // sVantishPlugInFtbl, whose address is the object's first member, so the
 // instance pointer is also its interface pointer.
 //
+// The object is a facade over parts that own their state, each with its thread
+// rule in its type: the unit's configuration (UnitConfiguration), the fit's
+// settings (FitParameters), the clients' overrides (ClientOverrides), the
+// published per-chip database (DatabaseSlot) and calibration (Calibration,
+// with its lock and store retries). The instance itself holds what the COM
+// frame needs, the service it was opened on and its registry entry.
+//
 // Threads: the host calls every table entry from its own thread; calibration
-// runs on the global queues (bring-up, factory retries, cache writes). Values
-// shared between them are atomics; the per-chip database is published whole
-// (see SpectralDatabase) and read through snapshotDatabase(). Calibration work
-// on one instance runs one piece at a time (calibrationMutex). Every queued
-// block holds a reference on the instance and on its service, so a host
-// Release never frees an instance (or the service) that queued work still uses.
+// runs on the global queues (bring-up, factory retries, cache writes). Every
+// queued block holds a reference on the instance and on its service, so a
+// host Release never frees an instance (or the service) that queued work
+// still uses.
 #pragma once
 
-#include "lightdb/LDBMInfo.h"
+#include "calibration/Calibration.h"
+#include "calibration/UnitConfiguration.h"
+#include "colour/FitParameters.h"
+#include "formats/ALSSensorType.h"
 #include "lightdb/DatabaseSlot.h"
-#include "lightdb/SpectralDatabase.h"
+#include "plugin/ClientOverrides.h"
 
 #include <CoreFoundation/CoreFoundation.h>
 #include <IOKit/IOKitLib.h>
@@ -22,31 +30,11 @@
 #include <IOKit/hid/IOHIDService.h>
 #include <IOKit/hid/IOHIDServiceFilterPlugIn.h>
 #include <dispatch/dispatch.h>
-#include <os/log.h>
 
 #include <array>
 #include <atomic>
 #include <cstdint>
 #include <functional>
-#include <memory>
-#include <mutex>
-
-struct Matrices;
-struct ALSCalibrationHeader;
-struct ALSCalibrationSubHeader;
-
-// Sensor type published by the driver as "ALSSensorType".
-enum eALSSensorType : uint32_t {
-    eALSSensorTypeUnknown = 0,
-    eALSSensorType4ChannelA = 1,
-    eALSSensorType4ChannelB = 2,
-    eALSSensorType6ChannelA = 3,
-    eALSSensorType6ChannelB = 4,
-    eALSSensorType5ChannelA = 5,
-    eALSSensorType5ChannelB = 6,
-    eALSSensorType5ChannelC = 7,
-    eALSSensorTypeVD6287 = 8,
-};
 
 extern "C" void* VantishPlugInFactory(CFAllocatorRef allocator, CFUUIDRef typeID);
 
@@ -79,80 +67,45 @@ public:
     void setPropertyForClient(CFStringRef key, CFTypeRef value, CFTypeRef client);
     void logALSSample(IOHIDEventRef event, bool isCopyEvent);
 
-    // ---- Factory calibration -------------------------------------------------------
-    void runCalibrationBringUp();
-    bool calibrateSensorWithDefaultCalibration(eALSSensorType type);
-    bool loadQVTCalibration(bool forceRebuild);
-    CFDataRef copyQVTCalibrationData(CFStringRef key);
-    bool processQVTCalibrationXwCAT2(CFDataRef& data, CFDataRef& record);
-    bool processQVTCalibrationVD6287_XwClv3(CFDataRef& data, CFDataRef& record);
-    // A new 10348-byte version-3 record from a 10440-byte version-1 record, or
-    // null when the input is not one or cannot be converted safely.
-    CFDataRef convertSorvelXwClv1Tov3(CFDataRef versionOne);
-    bool processQVTSpectrumXwCAT2(CFDataRef& data, Matrices& matrices);
-    bool processQVTSpectrumVD6287_XwClv3(CFDataRef& data, Matrices& matrices);
-
-    // ---- Configuration-supplied calibration --------------------------------------------
-    bool processSysConfigCalibration(bool asyncCreate, bool pushCalibration, bool processDatabase);
-    bool processSysConfigSensorCalibrationVD6286(CFDataRef& blob, long& entryOffset, ALSCalibrationHeader& header,
-                                                 ALSCalibrationSubHeader& subHeader, long& recordSize,
-                                                 CFDataRef& record);
-    // `build` is the private database that `matrices` points into; it is
-    // published once complete.
-    bool processSysConfigSpectrumVD6286(bool asyncCreate, CFDataRef& blob, long& entryOffset,
-                                        ALSCalibrationSubHeader& subHeader, Matrices& matrices,
-                                        const std::shared_ptr<SpectralDatabase>& build);
-
-    // ---- Publication of the per-chip database ---------------------------------------------
-    using DatabaseSnapshot = DatabaseSlot::Snapshot;
-    // Publishes a complete database and the new dbReady in one step.
-    void publishDatabase(SpectralDatabasePtr db, bool ready);
-    // Changes dbReady alone (colour off on fallback, on after a cache write).
-    void setDbReady(bool ready);
-    DatabaseSnapshot snapshotDatabase() const;
-    bool isDbReady() const;
-
-    // ---- Queued work that keeps the instance (and its service) alive ----------------------------
-    void dispatchRetained(dispatch_queue_t queue, std::function<void()> work);
-    void dispatchAfterRetained(dispatch_time_t when, dispatch_queue_t queue, std::function<void()> work);
-
     static IOHIDServiceFilterPlugInInterface sVantishPlugInFtbl;
 
-    // ---- Members, in the order of the object's layout ------------------------------------------
-    IOHIDServiceFilterPlugInInterface* interfaceTable; // first: the instance is its interface pointer
-    CFUUIDRef factoryID;
-    std::atomic<uint32_t> refCount;
-    IOHIDServiceRef service = nullptr;  // not retained; queued work retains it while it waits
-    io_service_t registryEntry = 0;     // released with the instance
-    std::atomic<uint32_t> orientation{1};
-    std::atomic<uint8_t> algoVersion{0};
-    std::atomic<uint8_t> colorAlgoOverride{0};
-    std::atomic<float> smallDBVersion{1.1f};
-    std::atomic<uint32_t> numberOfChannels{0};
-    std::atomic<uint32_t> dbChannelCount{0};
-    std::atomic<uint32_t> spectrumSampleCount{0};
-    DatabaseSlot databases; // the published database and dbReady
-    std::atomic<float> weightExponent{2.0f};
-    std::atomic<float> weightOffset{0.00001f};
-    std::array<std::atomic<float>, 3> lastXYZ;
-    std::atomic<uint8_t> rgbcOverrideActive{0};
-    std::array<std::atomic<uint32_t>, 6> rgbcOverride;
-    std::atomic<uint8_t> chromaticityOverrideActive{0};
-    std::atomic<double> overrideX{0.0};
-    std::atomic<double> overrideY{0.0};
-    std::atomic<double> overrideLuminance{0.0};
-    std::atomic<uint8_t> lambdaConfigured{0};
-    std::atomic<float> lambda{0.0f};
-    std::atomic<uint8_t> channelRatioMitigation{0};
-    std::atomic<uint32_t> mitigationType{0};
-    std::atomic<uint32_t> chipType{0};
-    std::atomic<uint32_t> sensorType{0};
-    std::atomic<uint32_t> deviceColor{0};
-    std::atomic<uint32_t> chipId{0};
-    std::atomic<uint8_t> isDravikOS{0};
-    std::atomic<uint32_t> qvtRetryCount{0};
-    double machTimeToSeconds = 0.0;
-    std::atomic<uint64_t> shortSampleRecords{0}; // sample records too short to read (throttles their log line)
+private:
+    // The documented seam through which tests reach the parts (plugin/TestAccess.h).
+    friend class VantishPlugInTestAccess;
 
-    std::recursive_mutex calibrationMutex;      // one calibration at a time per instance
+    // Calibration's view of the instance: the service, its registry entry and
+    // queued work that keeps the instance alive.
+    class Host final : public CalibrationHost {
+    public:
+        explicit Host(VantishPlugIn& plugin) : plugin_(plugin) {}
+        IOHIDServiceRef service() const override { return plugin_.service_; }
+        io_registry_entry_t registryEntry() const override { return plugin_.registryEntry_; }
+        void dispatchRetained(dispatch_queue_t queue, std::function<void()> work) override;
+        void dispatchAfterRetained(dispatch_time_t when, dispatch_queue_t queue, std::function<void()> work) override;
+
+    private:
+        VantishPlugIn& plugin_;
+    };
+
+    // First: the instance pointer is also its interface pointer.
+    IOHIDServiceFilterPlugInInterface* interfaceTable_;
+    CFUUIDRef factoryID_;
+    std::atomic<uint32_t> refCount_;
+    // Set by open on the host's thread before it queues calibration; not
+    // retained (queued work retains it while it waits).
+    IOHIDServiceRef service_ = nullptr;
+    io_service_t registryEntry_ = 0; // released with the instance
+
+    UnitConfiguration unit_;
+    FitParameters fit_;
+    ClientOverrides overrides_;
+    DatabaseSlot databases_;
+    Host host_{*this};
+    Calibration calibration_{host_, unit_, fit_, databases_};
+
+    // The event path's own: the last colour (for copied events), the short
+    // records seen (to throttle their log line), and the clock's scale.
+    std::array<std::atomic<float>, 3> lastXYZ_{};
+    std::atomic<uint64_t> shortSampleRecords_{0};
+    double machTimeToSeconds_ = 0.0; // set at construction
 };

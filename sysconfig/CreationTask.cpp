@@ -6,13 +6,13 @@
 // setting dbReady would switch colour on for the newer database on the strength
 // of a file that is not its own. So the task writes and sets dbReady only for
 // the database that is current, and it does both while holding the instance's
-// calibrationMutex: every build publishes while holding it too, so no newer
-// database can appear between the check, the write and dbReady. The mutex is
+// calibration lock: every build publishes while holding it too, so no newer
+// database can appear between the check, the write and dbReady. The lock is
 // recursive, so the in-place task of a synchronous build runs under the lock
 // its caller already holds.
 #include "lightdb/LDBM.h"
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 #include "sysconfig/DatabaseBuild.h"
 
 #include <mutex>
@@ -29,10 +29,10 @@ struct CacheKeys {
     unsigned chipId = 0;
 };
 
-void writeCache(VantishPlugIn& plugin, const SpectralDatabasePtr& db, const CacheKeys& keys)
+void writeCache(Calibration& calibration, const SpectralDatabasePtr& db, const CacheKeys& keys)
 {
-    std::lock_guard lock(plugin.calibrationMutex);
-    if (plugin.snapshotDatabase().db != db) {
+    const auto guard = calibration.lock();
+    if (calibration.databases().snapshot().db != db) {
         VLOG_INFO("A newer database has been published; this one's cache is not written.\n");
         return;
     }
@@ -43,21 +43,21 @@ void writeCache(VantishPlugIn& plugin, const SpectralDatabasePtr& db, const Cach
         return;
     }
     VLOG_DEFAULT("Small DB has been created\n");
-    plugin.setDbReady(true);
+    calibration.databases().setReady(true);
 }
 
 } // namespace
 
-void startCreationTask(VantishPlugIn& plugin, bool asyncCreate, SpectralDatabasePtr db)
+void startCreationTask(Calibration& calibration, bool asyncCreate, SpectralDatabasePtr db)
 {
-    const CacheKeys keys{int(plugin.orientation.load()), int(plugin.algoVersion.load()),
-                         int(plugin.numberOfChannels.load()), plugin.chipId.load()};
+    const CacheKeys keys{int(calibration.unit().orientation.load()), int(calibration.unit().algoVersion.load()),
+                         int(calibration.unit().numberOfChannels.load()), calibration.unit().chipId.load()};
     if (!asyncCreate) {
-        writeCache(plugin, db, keys);
+        writeCache(calibration, db, keys);
         return;
     }
-    plugin.dispatchRetained(dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_DEFAULT, 0),
-                            [&plugin, db = std::move(db), keys] { writeCache(plugin, db, keys); });
+    calibration.host().dispatchRetained(dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_DEFAULT, 0),
+                            [&calibration, db = std::move(db), keys] { writeCache(calibration, db, keys); });
 }
 
 } // namespace sysconfig

@@ -2,12 +2,12 @@
 // that carries a calibration entry's spectra into the reference scan.
 #include "lightdb/LDBM.h"
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 #include "sysconfig/DatabaseBuild.h"
 
 namespace sysconfig {
 
-bool finishDatabaseBuild(VantishPlugIn& plugin, bool asyncCreate, Matrices& matrices,
+bool finishDatabaseBuild(Calibration& calibration, bool asyncCreate, Matrices& matrices,
                          const std::shared_ptr<SpectralDatabase>& db)
 {
     const int code = LDBMParseBigDB(&db->dbInfo, ProgressCallback, &matrices, BigDBTypeDefault);
@@ -18,11 +18,11 @@ bool finishDatabaseBuild(VantishPlugIn& plugin, bool asyncCreate, Matrices& matr
     VLOG_DEFAULT("Parsed big DB\n");
     // The arrays are complete. Colour stays as it was (on with the old database,
     // it goes on with this one) until the cache write decides. The caller holds
-    // calibrationMutex, so no creation task changes dbReady between the read and
+    // calibration lock, so no creation task changes dbReady between the read and
     // the publication.
     SpectralDatabasePtr complete = db;
-    plugin.publishDatabase(complete, plugin.isDbReady());
-    startCreationTask(plugin, asyncCreate, std::move(complete));
+    calibration.databases().publish(complete, calibration.databases().isReady());
+    startCreationTask(calibration, asyncCreate, std::move(complete));
     return true;
 }
 

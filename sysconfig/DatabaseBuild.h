@@ -16,7 +16,7 @@
 #include <memory>
 #include <span>
 
-class VantishPlugIn;
+class Calibration;
 
 namespace sysconfig {
 
@@ -30,18 +30,18 @@ bool prepareMatrices(SpectralDatabase& db, unsigned channels, Matrices& matrices
 // The generic four-channel step: the entry's spectra (and infrared compensation
 // from `auxBlob`, when found) into `matrices`, then finishDatabaseBuild. True
 // once the reference database has been scanned.
-bool buildGenericSpectrum(VantishPlugIn& plugin, bool asyncCreate, std::span<const uint8_t> entry, uint8_t revision,
+bool buildGenericSpectrum(Calibration& calibration, bool asyncCreate, std::span<const uint8_t> entry, uint8_t revision,
                           CFTypeRef auxBlob, Matrices& matrices, const std::shared_ptr<SpectralDatabase>& db);
 
 // Scans the reference database through `matrices` into `db`, publishes `db`
 // (dbReady as it was) and writes its cache, in place or as a queued task.
 // True once `db` is complete and published.
-bool finishDatabaseBuild(VantishPlugIn& plugin, bool asyncCreate, Matrices& matrices,
+bool finishDatabaseBuild(Calibration& calibration, bool asyncCreate, Matrices& matrices,
                          const std::shared_ptr<SpectralDatabase>& db);
 
 // Writes the cache for `db` and sets dbReady when it was written and `db` is
 // still the published database. With `asyncCreate` it runs as a task on the
 // default-priority global queue (holding the instance and `db`), else in place.
-void startCreationTask(VantishPlugIn& plugin, bool asyncCreate, SpectralDatabasePtr db);
+void startCreationTask(Calibration& calibration, bool asyncCreate, SpectralDatabasePtr db);
 
 } // namespace sysconfig

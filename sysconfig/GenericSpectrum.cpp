@@ -3,7 +3,7 @@
 // "alsAuxCalibration", then the reference scan.
 #include "support/LittleEndian.h"
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
+#include "calibration/Calibration.h"
 #include "sysconfig/DatabaseBuild.h"
 
 #include <algorithm>
@@ -31,7 +31,7 @@ int nirMaximum(const Matrices& matrices, unsigned nSamples)
 
 // Sets up the tail scaling when the auxiliary blob has an entry for this
 // orientation; anything malformed leaves the spectra uncompensated.
-void applyInfraredCompensation(const VantishPlugIn& plugin, CFTypeRef auxBlob, unsigned nSamples, Matrices& matrices)
+void applyInfraredCompensation(const Calibration& calibration, CFTypeRef auxBlob, unsigned nSamples, Matrices& matrices)
 {
     VLOG_INFO("ALS auxiliary calibration found \n");
     if (CFGetTypeID(auxBlob) != CFDataGetTypeID())
@@ -42,7 +42,7 @@ void applyInfraredCompensation(const VantishPlugIn& plugin, CFTypeRef auxBlob, u
         VLOG_ERROR("alsAuxCalibration of %ld bytes is shorter than its header.\n", long(bytes.size()));
         return;
     }
-    const auto entry = findCalibrationEntry(bytes, header->entryCount, plugin.orientation, "alsAuxCalibration");
+    const auto entry = findCalibrationEntry(bytes, header->entryCount, calibration.unit().orientation, "alsAuxCalibration");
     if (!entry)
         return;
     if (entry->bytes.size() < aux::kEntrySize) {
@@ -65,7 +65,7 @@ void applyInfraredCompensation(const VantishPlugIn& plugin, CFTypeRef auxBlob, u
 
 } // namespace
 
-bool buildGenericSpectrum(VantishPlugIn& plugin, bool asyncCreate, std::span<const uint8_t> entry, uint8_t revision,
+bool buildGenericSpectrum(Calibration& calibration, bool asyncCreate, std::span<const uint8_t> entry, uint8_t revision,
                           CFTypeRef auxBlob, Matrices& matrices, const std::shared_ptr<SpectralDatabase>& db)
 {
     if (matrices.nChannels != int32_t(generic::kSpectrumChannels))
@@ -86,9 +86,9 @@ bool buildGenericSpectrum(VantishPlugIn& plugin, bool asyncCreate, std::span<con
         return false;
     }
 
-    const uint8_t algoOverride = plugin.colorAlgoOverride;
-    plugin.algoVersion = algoOverride != 0 ? algoOverride : le::get<uint8_t>(block, generic::kSpectrumAlgo);
-    plugin.spectrumSampleCount = nSamples;
+    const uint8_t algoOverride = calibration.unit().colorAlgoOverride;
+    calibration.unit().algoVersion = algoOverride != 0 ? algoOverride : le::get<uint8_t>(block, generic::kSpectrumAlgo);
+    calibration.unit().spectrumSampleCount = nSamples;
 
     // Four channels per spectral sample, as stored (the step runs for four-channel sensors).
     constexpr size_t channels = generic::kSpectrumChannels;
@@ -100,10 +100,10 @@ bool buildGenericSpectrum(VantishPlugIn& plugin, bool asyncCreate, std::span<con
         matrices.channelWeights[c] = float(le::get<int32_t>(block, generic::kSpectrumWeights + 4 * c)) / 1000000.0f;
 
     if (auxBlob)
-        applyInfraredCompensation(plugin, auxBlob, nSamples, matrices);
+        applyInfraredCompensation(calibration, auxBlob, nSamples, matrices);
 
-    VLOG_INFO("Algo version: %d NSamples: %d\n", int(plugin.algoVersion.load()), int(nSamples));
-    return finishDatabaseBuild(plugin, asyncCreate, matrices, db);
+    VLOG_INFO("Algo version: %d NSamples: %d\n", int(calibration.unit().algoVersion.load()), int(nSamples));
+    return finishDatabaseBuild(calibration, asyncCreate, matrices, db);
 }
 
 } // namespace sysconfig

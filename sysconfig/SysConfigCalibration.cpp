@@ -6,7 +6,9 @@
 #include "lightdb/CachedDB.h"
 #include "lightdb/LDBM.h"
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
+#include "sysconfig/SysConfigCalibration.h"
+
+#include "calibration/Calibration.h"
 #include "sysconfig/DatabaseBuild.h"
 #include "sysconfig/GenericRecord.h"
 #include "sysconfig/SysConfigFormat.h"
@@ -31,7 +33,7 @@ CFOwned<CFTypeRef> copyRegistryBlob(io_registry_entry_t entry, CFStringRef key)
 
 // The generic entry's record; also takes the entry's channel count and the
 // algorithm override, as the driver will work with them.
-CFDataRef createGenericRecord(VantishPlugIn& plugin, const CalibrationEntry& entry, const ALSCalibrationHeader& header)
+CFDataRef createGenericRecord(Calibration& calibration, const CalibrationEntry& entry, const ALSCalibrationHeader& header)
 {
     const auto layout = genericEntryLayout(entry.bytes, header.revision);
     if (!layout)
@@ -39,31 +41,31 @@ CFDataRef createGenericRecord(VantishPlugIn& plugin, const CalibrationEntry& ent
     CFDataRef data = sysconfig::createGenericRecord(entry.bytes, *layout, header.entryCount);
     if (!data)
         return nullptr;
-    plugin.numberOfChannels = layout->nChannels;
-    plugin.dbChannelCount = layout->nChannels;
-    if (const uint8_t algoOverride = plugin.colorAlgoOverride; algoOverride != 0)
-        plugin.algoVersion = algoOverride;
+    calibration.unit().numberOfChannels = layout->nChannels;
+    calibration.unit().dbChannelCount = layout->nChannels;
+    if (const uint8_t algoOverride = calibration.unit().colorAlgoOverride; algoOverride != 0)
+        calibration.unit().algoVersion = algoOverride;
     return data;
 }
 
-PushOutcome pushCalibrationRecord(VantishPlugIn& plugin, CFDataRef blob, ALSCalibrationHeader header,
+PushOutcome pushCalibrationRecord(Calibration& calibration, CFDataRef blob, ALSCalibrationHeader header,
                                   CalibrationEntry entry)
 {
     CFDataRef created = nullptr;
     if (entry.subHeader.chipType == kChipTypeVD6286) {
         long recordSize = 0;
-        if (!plugin.processSysConfigSensorCalibrationVD6286(blob, entry.offset, header, entry.subHeader, recordSize,
+        if (!processSysConfigSensorCalibrationVD6286(calibration, blob, entry.offset, header, entry.subHeader, recordSize,
                                                             created))
             return PushOutcome::Failed;
     } else {
-        created = createGenericRecord(plugin, entry, header);
+        created = createGenericRecord(calibration, entry, header);
         if (!created)
             return PushOutcome::Failed;
     }
     CFOwned<CFDataRef> record(created);
-    if (!plugin.service)
+    if (!calibration.host().service())
         return PushOutcome::NoService;
-    if (!IOHIDServiceSetProperty(plugin.service, CFSTR("ALSCalibrationData"), record.get())) {
+    if (!IOHIDServiceSetProperty(calibration.host().service(), CFSTR("ALSCalibrationData"), record.get())) {
         VLOG_ERROR("Failed to set ALS calibration data.");
         return PushOutcome::Failed;
     }
@@ -72,16 +74,16 @@ PushOutcome pushCalibrationRecord(VantishPlugIn& plugin, CFDataRef blob, ALSCali
 
 // Loads the cached database or builds it from the entry; the result as the
 // caller reports it, given the push's result so far.
-bool loadOrBuildDatabase(VantishPlugIn& plugin, bool asyncCreate, CFDataRef blob, const ALSCalibrationHeader& header,
+bool loadOrBuildDatabase(Calibration& calibration, bool asyncCreate, CFDataRef blob, const ALSCalibrationHeader& header,
                          CalibrationEntry entry, CFTypeRef auxBlob, bool resultSoFar)
 {
-    const unsigned channels = plugin.numberOfChannels;
+    const unsigned channels = calibration.unit().numberOfChannels;
     auto db = std::make_shared<SpectralDatabase>();
-    const CacheKey key{int(plugin.orientation.load()), plugin.smallDBVersion.load(), plugin.chipId.load()};
+    const CacheKey key{int(calibration.unit().orientation.load()), calibration.unit().smallDBVersion.load(), calibration.unit().chipId.load()};
     if (processCachedDB(key, int(channels), BigDBTypeDefault, *db)) {
-        plugin.algoVersion = uint8_t(db->dbInfo.algo);
+        calibration.unit().algoVersion = uint8_t(db->dbInfo.algo);
         VLOG_DEFAULT("Found cached DB\n");
-        plugin.publishDatabase(std::move(db), true);
+        calibration.databases().publish(std::move(db), true);
         return true;
     }
 
@@ -95,23 +97,24 @@ bool loadOrBuildDatabase(VantishPlugIn& plugin, bool asyncCreate, CFDataRef blob
         return resultSoFar;
     }
     if (generic)
-        return buildGenericSpectrum(plugin, asyncCreate, entry.bytes, header.revision, auxBlob, matrices, db) ||
+        return buildGenericSpectrum(calibration, asyncCreate, entry.bytes, header.revision, auxBlob, matrices, db) ||
                resultSoFar;
-    return plugin.processSysConfigSpectrumVD6286(asyncCreate, blob, entry.offset, entry.subHeader, matrices, db);
+    return processSysConfigSpectrumVD6286(calibration, asyncCreate, blob, entry.offset, entry.subHeader, matrices, db);
 }
 
 } // namespace
 
-bool VantishPlugIn::processSysConfigCalibration(bool asyncCreate, bool pushCalibration, bool processDatabase)
+bool processSysConfigCalibration(Calibration& calibration, bool asyncCreate, bool pushCalibration, bool processDatabase)
 {
-    std::lock_guard lock(calibrationMutex);
+    const auto guard = calibration.lock();
+    const io_registry_entry_t registryEntry = calibration.host().registryEntry();
     if (!registryEntry)
         return false;
-    const auto calibration = copyRegistryBlob(registryEntry, CFSTR("alsCalibration"));
+    const auto calibrationBlob = copyRegistryBlob(registryEntry, CFSTR("alsCalibration"));
     const auto auxCalibration = copyRegistryBlob(registryEntry, CFSTR("alsAuxCalibration"));
-    if (!calibration || CFGetTypeID(calibration.get()) != CFDataGetTypeID())
+    if (!cf::isData(calibrationBlob.get()))
         return false;
-    CFDataRef blob = static_cast<CFDataRef>(calibration.get());
+    CFDataRef blob = static_cast<CFDataRef>(calibrationBlob.get());
     const auto bytes = bytesOf(blob);
 
     const auto header = ALSCalibrationHeader::decode(bytes);
@@ -132,20 +135,20 @@ bool VantishPlugIn::processSysConfigCalibration(bool asyncCreate, bool pushCalib
     VLOG_INFO("supported calibration version %d,%d with size %d\n", int(header->version), int(header->revision),
               int(header->totalSize));
 
-    const auto entry = findCalibrationEntry(bytes, header->entryCount, orientation, "alsCalibration");
+    const auto entry = findCalibrationEntry(bytes, header->entryCount, calibration.unit().orientation, "alsCalibration");
     if (!entry)
         return false;
-    VLOG_INFO("Found calibration for orientation = %d, senzorType = %d, chipType = %d \n", int(orientation.load()),
+    VLOG_INFO("Found calibration for orientation = %d, senzorType = %d, chipType = %d \n", int(calibration.unit().orientation.load()),
               int(entry->subHeader.sensorType), int(entry->subHeader.chipType));
 
     bool result = false;
     if (pushCalibration) {
-        const PushOutcome pushed = pushCalibrationRecord(*this, blob, *header, *entry);
+        const PushOutcome pushed = pushCalibrationRecord(calibration, blob, *header, *entry);
         if (pushed == PushOutcome::Failed)
             return false;
         result = pushed == PushOutcome::Set;
     }
     if (!processDatabase)
         return result;
-    return loadOrBuildDatabase(*this, asyncCreate, blob, *header, *entry, auxCalibration.get(), result);
+    return loadOrBuildDatabase(calibration, asyncCreate, blob, *header, *entry, auxCalibration.get(), result);
 }

@@ -3,7 +3,9 @@
 #include "calibration/DriverRecords.h"
 #include "support/LittleEndian.h"
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
+#include "sysconfig/SysConfigCalibration.h"
+
+#include "calibration/Calibration.h"
 #include "sysconfig/FixedPoint.h"
 #include "sysconfig/RecordFields.h"
 #include "sysconfig/SysConfigFormat.h"
@@ -46,7 +48,7 @@ CFDataRef createRecord(std::span<const uint8_t> entry, uint8_t entryCount, unsig
 
 } // namespace
 
-bool VantishPlugIn::processSysConfigSensorCalibrationVD6286(CFDataRef& blob, long& entryOffset,
+bool processSysConfigSensorCalibrationVD6286(Calibration& calibration, CFDataRef& blob, long& entryOffset,
                                                             ALSCalibrationHeader& header,
                                                             ALSCalibrationSubHeader& subHeader, long& recordSize,
                                                             CFDataRef& record)
@@ -66,8 +68,8 @@ bool VantishPlugIn::processSysConfigSensorCalibrationVD6286(CFDataRef& blob, lon
     CFDataRef created = createRecord(entry, header.entryCount, nChannels, nGains);
     if (!created)
         return false;
-    numberOfChannels = nChannels;
-    dbChannelCount = nChannels;
+    calibration.unit().numberOfChannels = nChannels;
+    calibration.unit().dbChannelCount = nChannels;
     recordSize = long(driver::kFiveChannelRecord.size);
     record = created;
     return true;

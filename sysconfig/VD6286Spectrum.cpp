@@ -2,12 +2,14 @@
 // then the reference scan. No infrared compensation for this chip.
 #include "support/LittleEndian.h"
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
+#include "sysconfig/SysConfigCalibration.h"
+
+#include "calibration/Calibration.h"
 #include "sysconfig/DatabaseBuild.h"
 
 using namespace sysconfig;
 
-bool VantishPlugIn::processSysConfigSpectrumVD6286(bool asyncCreate, CFDataRef& blob, long& entryOffset,
+bool processSysConfigSpectrumVD6286(Calibration& calibration, bool asyncCreate, CFDataRef& blob, long& entryOffset,
                                                    ALSCalibrationSubHeader& subHeader, Matrices& matrices,
                                                    const std::shared_ptr<SpectralDatabase>& build)
 {
@@ -25,9 +27,9 @@ bool VantishPlugIn::processSysConfigSpectrumVD6286(bool asyncCreate, CFDataRef& 
         return false;
     }
 
-    const uint8_t algoOverride = colorAlgoOverride;
-    algoVersion = algoOverride != 0 ? algoOverride : le::get<uint8_t>(entry, vd6286::kAlgo);
-    spectrumSampleCount = nSamples;
+    const uint8_t algoOverride = calibration.unit().colorAlgoOverride;
+    calibration.unit().algoVersion = algoOverride != 0 ? algoOverride : le::get<uint8_t>(entry, vd6286::kAlgo);
+    calibration.unit().spectrumSampleCount = nSamples;
 
     matrices.channelSpectra.resize(nSamples * channels);
     for (size_t i = 0; i < matrices.channelSpectra.size(); ++i)
@@ -36,6 +38,6 @@ bool VantishPlugIn::processSysConfigSpectrumVD6286(bool asyncCreate, CFDataRef& 
     for (size_t c = 0; c < channels; ++c)
         matrices.channelWeights[c] = float(le::get<int32_t>(entry, vd6286::kWeights + 4 * c)) / 1000000.0f;
 
-    VLOG_INFO("Algo version: %d NSamples: %d\n", int(algoVersion.load()), int(nSamples));
-    return finishDatabaseBuild(*this, asyncCreate, matrices, build);
+    VLOG_INFO("Algo version: %d NSamples: %d\n", int(calibration.unit().algoVersion.load()), int(nSamples));
+    return finishDatabaseBuild(calibration, asyncCreate, matrices, build);
 }

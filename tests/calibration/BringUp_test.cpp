@@ -11,9 +11,9 @@ protected:
     {
         CalibrationTest::SetUp();
         VPSetBootArgs("debug=0x14e");
-        plugin->sensorType = eALSSensorType5ChannelA;
-        plugin->chipId = 0x1A2B3C4D;
-        plugin->publishDatabase(std::make_shared<const SpectralDatabase>(), true);
+        parts(*plugin).unit().sensorType = eALSSensorType5ChannelA;
+        parts(*plugin).unit().chipId = 0x1A2B3C4D;
+        parts(*plugin).databases().publish(std::make_shared<const SpectralDatabase>(), true);
     }
     // The "crgb" value the driver received, or -1 when none.
     int crgb()
@@ -31,7 +31,7 @@ protected:
     {
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Switching off color adaptation support.\n"));
         EXPECT_EQ(crgb(), 0);
-        EXPECT_FALSE(plugin->isDbReady());
+        EXPECT_FALSE(parts(*plugin).databases().isReady());
         const std::vector<uint8_t> record = received("ALSCalibrationData");
         ASSERT_EQ(record.size(), 193u);
         EXPECT_EQ(ct::rd32(record, 1), 3u); // built-in default
@@ -44,7 +44,7 @@ TEST_F(BringUpTest, BootArgumentForcesTheDefaultWhateverItsValue)
         SCOPED_TRACE(args);
         VPSetBootArgs(std::string(args));
         writeStore("XwCA", ct::makeXwCA({}).vec());
-        plugin->runCalibrationBringUp();
+        parts(*plugin).calibration().runCalibrationBringUp();
         EXPECT_EQ(VPQVTReadCount(), 0u);
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "boot-args are set to use default calibration"));
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Getting QVT calibration...\n"));
@@ -60,7 +60,7 @@ TEST_F(BringUpTest, FactoryCalibrationLeavesCrgbAlone)
         VPSetBootArgs(sysctlError ? "als_default_calibration=1" : "debug=0x14e");
         VPSetSysctlFailure(sysctlError);
         writeStore("XwCA", ct::makeXwCA({}).vec());
-        plugin->runCalibrationBringUp();
+        parts(*plugin).calibration().runCalibrationBringUp();
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "QVT Calibration has been loaded successfully"));
         EXPECT_FALSE(log.contains("boot-args are set to use default calibration"));
         EXPECT_EQ(crgb(), -1);
@@ -70,13 +70,13 @@ TEST_F(BringUpTest, FactoryCalibrationLeavesCrgbAlone)
 
 TEST_F(BringUpTest, FailedOrRejectedCalibrationFallsBackToTheDefault)
 {
-    plugin->runCalibrationBringUp(); // empty store
+    parts(*plugin).calibration().runCalibrationBringUp(); // empty store
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Failed to load QVT calibration.\n"));
     expectDefaultPath();
 
     // A record whose counts exceed its layout ends the same way.
     writeStore("XwCA", ct::makeXwCA({.nChannels = 9}).vec());
-    plugin->runCalibrationBringUp();
+    parts(*plugin).calibration().runCalibrationBringUp();
     expectDefaultPath();
 }
 

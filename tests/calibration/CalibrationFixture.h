@@ -3,7 +3,7 @@
 // service with a factory store, and a small reference database.
 #pragma once
 
-#include "plugin/VantishPlugIn.h"
+#include "plugin/TestAccess.h"
 #include "support/TestSupport.h"
 
 #include <CoreFoundation/CoreFoundation.h>
@@ -194,7 +194,7 @@ protected:
         plugin = static_cast<VantishPlugIn*>(VantishPlugInFactory(kCFAllocatorDefault, kIOHIDServiceFilterPlugInTypeID));
         ASSERT_NE(plugin, nullptr);
         service = VPServiceCreate(7);
-        plugin->service = service;
+        parts(*plugin).service() = service;
     }
 
     void TearDown() override

@@ -54,11 +54,11 @@ TEST_F(DefaultCalibrationTest, FourChannelRecordFollowsTypeAndDeviceColour)
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(testing::Message() << "type " << c.type << " colour " << c.colour);
-        plugin->deviceColor = c.colour;
-        plugin->numberOfChannels = 0;
-        EXPECT_TRUE(plugin->calibrateSensorWithDefaultCalibration(c.type));
+        parts(*plugin).unit().deviceColor = c.colour;
+        parts(*plugin).unit().numberOfChannels = 0;
+        EXPECT_TRUE(parts(*plugin).calibration().calibrateSensorWithDefaultCalibration(c.type));
         EXPECT_BYTES_EQ(received("ALSCalibrationData"), c.want.vec());
-        EXPECT_EQ(plugin->numberOfChannels.load(), 4u);
+        EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 4u);
     }
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "luxCoeff[3]=15040/65536"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Calibrate sensor with default calibration data. Sensor type = 2"));
@@ -71,12 +71,12 @@ TEST_F(DefaultCalibrationTest, WideRecordsForFiveAndSixChannelTypes)
                                 eALSSensorType6ChannelA, eALSSensorType6ChannelB}) {
         SCOPED_TRACE(type);
         const bool sixChannels = type == eALSSensorType6ChannelA || type == eALSSensorType6ChannelB;
-        plugin->chipType = 2;
-        EXPECT_TRUE(plugin->calibrateSensorWithDefaultCalibration(type));
+        parts(*plugin).unit().chipType = 2;
+        EXPECT_TRUE(parts(*plugin).calibration().calibrateSensorWithDefaultCalibration(type));
         EXPECT_BYTES_EQ(received("ALSCalibrationData"), (sixChannels ? six : five).vec());
-        EXPECT_EQ(plugin->chipType.load(), 0u);
-        EXPECT_EQ(plugin->numberOfChannels.load(), sixChannels ? 6u : 5u);
-        EXPECT_EQ(plugin->dbChannelCount.load(), 5u);
+        EXPECT_EQ(parts(*plugin).unit().chipType.load(), 0u);
+        EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), sixChannels ? 6u : 5u);
+        EXPECT_EQ(parts(*plugin).unit().dbChannelCount.load(), 5u);
     }
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "luxCoeff[4]=0.008600"));
     EXPECT_EQ(log.count("luxCoeff[5]=0.086000"), 2u);
@@ -85,23 +85,23 @@ TEST_F(DefaultCalibrationTest, WideRecordsForFiveAndSixChannelTypes)
 TEST_F(DefaultCalibrationTest, TypesWithoutDefaultSetNothing)
 {
     for (uint32_t type : {0u, 8u, 9u}) {
-        EXPECT_FALSE(plugin->calibrateSensorWithDefaultCalibration(eALSSensorType(type)));
+        EXPECT_FALSE(parts(*plugin).calibration().calibrateSensorWithDefaultCalibration(eALSSensorType(type)));
         EXPECT_TRUE(received("ALSCalibrationData").empty());
     }
-    EXPECT_EQ(plugin->numberOfChannels.load(), 0u);
+    EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 0u);
 }
 
 TEST_F(DefaultCalibrationTest, NoServiceOrRefusalReportsFailure)
 {
-    plugin->service = nullptr;
-    EXPECT_FALSE(plugin->calibrateSensorWithDefaultCalibration(eALSSensorType5ChannelA));
+    parts(*plugin).service() = nullptr;
+    EXPECT_FALSE(parts(*plugin).calibration().calibrateSensorWithDefaultCalibration(eALSSensorType5ChannelA));
     EXPECT_FALSE(log.contains("Failed to set ALS calibration data."));
 
-    plugin->service = service;
+    parts(*plugin).service() = service;
     VPServiceRefuseProperty(service, CFSTR("ALSCalibrationData"), true);
-    EXPECT_FALSE(plugin->calibrateSensorWithDefaultCalibration(eALSSensorType6ChannelA));
+    EXPECT_FALSE(parts(*plugin).calibration().calibrateSensorWithDefaultCalibration(eALSSensorType6ChannelA));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to set ALS calibration data."));
-    EXPECT_EQ(plugin->numberOfChannels.load(), 6u); // the fields stay set
+    EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 6u); // the fields stay set
 }
 
 } // namespace

@@ -16,58 +16,58 @@ protected:
     {
         CalibrationTest::SetUp();
         ct::writeReferenceDatabases(system.path(), kSources);
-        plugin->chipId = 0x1A2B3C4D;
+        parts(*plugin).unit().chipId = 0x1A2B3C4D;
     }
 };
 
 TEST_F(FactoryDatabaseTest, BuildsCachesPublishesAndReloads)
 {
     writeStore("XwCA", ct::makeXwCA({}).vec());
-    ASSERT_TRUE(plugin->loadQVTCalibration(false));
+    ASSERT_TRUE(parts(*plugin).calibration().loadQVTCalibration(false));
     EXPECT_EQ(log.count("Parsed big DB\n"), 1u);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Small DB has been created\n"));
     EXPECT_TRUE(std::filesystem::exists(roots.cacheDir() / "bzrgbc_1.sqlite"));
-    const auto built = plugin->snapshotDatabase();
+    const auto built = parts(*plugin).databases().snapshot();
     ASSERT_TRUE(built.ready);
     EXPECT_EQ(built.db->dbSampleCount, uint32_t(kSources));
     EXPECT_EQ(built.db->dbChannelCount, 5u);
     EXPECT_TRUE(built.db->channelStdDev.empty()); // no lambda configured: not normalised
 
     // The cache serves the next load; a forced rebuild scans the reference again.
-    ASSERT_TRUE(plugin->loadQVTCalibration(false));
+    ASSERT_TRUE(parts(*plugin).calibration().loadQVTCalibration(false));
     EXPECT_EQ(log.count("Parsed big DB\n"), 1u);
-    const auto cached = plugin->snapshotDatabase();
+    const auto cached = parts(*plugin).databases().snapshot();
     ASSERT_TRUE(cached.ready);
     EXPECT_NE(cached.db, built.db);
     for (size_t i = 0; i < built.db->dbChannelResponses.size(); ++i)
         EXPECT_NEAR(cached.db->dbChannelResponses[i], built.db->dbChannelResponses[i], 1e-5);
 
-    ASSERT_TRUE(plugin->loadQVTCalibration(true));
+    ASSERT_TRUE(parts(*plugin).calibration().loadQVTCalibration(true));
     EXPECT_EQ(log.count("Parsed big DB\n"), 2u);
 }
 
 TEST_F(FactoryDatabaseTest, ResponsesAreNormalisedBeforeAnyoneSeesThem)
 {
     writeStore("XwCA", ct::makeXwCA({}).vec());
-    plugin->lambdaConfigured = 1;
+    parts(*plugin).fit().lambdaConfigured = 1;
 
     std::atomic<bool> done{false};
     std::atomic<int> unnormalisedSeen{0};
     std::thread reader([&] {
         while (!done.load()) {
-            const auto snapshot = plugin->snapshotDatabase();
+            const auto snapshot = parts(*plugin).databases().snapshot();
             if (snapshot.ready && snapshot.db->channelStdDev.empty())
                 ++unnormalisedSeen;
         }
     });
-    const bool loaded = plugin->loadQVTCalibration(false);
+    const bool loaded = parts(*plugin).calibration().loadQVTCalibration(false);
     done = true;
     reader.join();
     ASSERT_TRUE(loaded);
     EXPECT_EQ(unnormalisedSeen.load(), 0);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "RR normalization"));
 
-    const auto snapshot = plugin->snapshotDatabase();
+    const auto snapshot = parts(*plugin).databases().snapshot();
     ASSERT_TRUE(snapshot.ready);
     const SpectralDatabase& db = *snapshot.db;
     const size_t n = db.dbSampleCount;
@@ -97,10 +97,10 @@ TEST_F(FactoryDatabaseTest, DatabaseUnusableForColourIsNotPublished)
 {
     // A 4-channel layout that only calibrates three channels.
     writeStore("XwCl", ct::makeXwCl({.deviceID = 35, .nChannels = 3, .nGains = 8}).vec());
-    plugin->chipId = 0;
-    ASSERT_TRUE(plugin->loadQVTCalibration(false));
+    parts(*plugin).unit().chipId = 0;
+    ASSERT_TRUE(parts(*plugin).calibration().loadQVTCalibration(false));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to create small DB 3\n"));
-    const auto snapshot = plugin->snapshotDatabase();
+    const auto snapshot = parts(*plugin).databases().snapshot();
     EXPECT_FALSE(snapshot.ready);
     EXPECT_EQ(snapshot.db, nullptr);
 }
@@ -109,16 +109,16 @@ TEST_F(FactoryDatabaseTest, MissingReferenceLeavesTheDatabaseAsItWas)
 {
     std::filesystem::remove_all(system.path() / "Vantish.plugin");
     writeStore("XwCA", ct::makeXwCA({}).vec());
-    ASSERT_TRUE(plugin->loadQVTCalibration(false));
-    EXPECT_FALSE(plugin->isDbReady());
+    ASSERT_TRUE(parts(*plugin).calibration().loadQVTCalibration(false));
+    EXPECT_FALSE(parts(*plugin).databases().isReady());
     EXPECT_EQ(log.count("Parsed big DB\n"), 0u);
 }
 
 TEST_F(FactoryDatabaseTest, VD6287DatabaseGoesToTheDriver)
 {
     writeStore("XwCA", ct::makeVD6287v3().vec());
-    ASSERT_TRUE(plugin->loadQVTCalibration(false));
-    const auto snapshot = plugin->snapshotDatabase();
+    ASSERT_TRUE(parts(*plugin).calibration().loadQVTCalibration(false));
+    const auto snapshot = parts(*plugin).databases().snapshot();
     ASSERT_TRUE(snapshot.ready);
     const SpectralDatabase& db = *snapshot.db;
     const std::vector<uint8_t> record = received("ALSColorCalibration");

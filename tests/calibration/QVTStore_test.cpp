@@ -21,8 +21,8 @@ protected:
 TEST_F(QVTStoreTest, EmptyStoreOnDravikOSIsRetried20TimesThenGivenUp)
 {
     VPDispatchSetDelayMode(VPDelayMode::Manual);
-    plugin->isDravikOS = 1;
-    EXPECT_FALSE(plugin->loadQVTCalibration(false));
+    parts(*plugin).unit().isDravikOS = 1;
+    EXPECT_FALSE(parts(*plugin).calibration().loadQVTCalibration(false));
     for (int attempt = 1; attempt <= 20; ++attempt) {
         ASSERT_TRUE(log.contains(OS_LOG_TYPE_INFO, retryLine(attempt))) << attempt;
         ASSERT_EQ(VPDispatchPendingDelayed(), 1u);
@@ -36,7 +36,7 @@ TEST_F(QVTStoreTest, EmptyStoreOnDravikOSIsRetried20TimesThenGivenUp)
     EXPECT_EQ(VPQVTReadCount(), 2u * 21);
 
     // A later request fails silently and schedules nothing.
-    EXPECT_FALSE(plugin->loadQVTCalibration(true));
+    EXPECT_FALSE(parts(*plugin).calibration().loadQVTCalibration(true));
     EXPECT_EQ(countStartingWith("Retrieving QVT calibration data failed"), 20u);
     EXPECT_EQ(VPDispatchPendingDelayed(), 0u);
 }
@@ -44,13 +44,13 @@ TEST_F(QVTStoreTest, EmptyStoreOnDravikOSIsRetried20TimesThenGivenUp)
 TEST_F(QVTStoreTest, RetryKeepsTheInstanceAliveAndLoadsOnceTheStoreIsReady)
 {
     VPDispatchSetDelayMode(VPDelayMode::Manual);
-    plugin->isDravikOS = 1;
-    plugin->chipId = 0x1A2B3C4D;
-    EXPECT_FALSE(plugin->loadQVTCalibration(false));
+    parts(*plugin).unit().isDravikOS = 1;
+    parts(*plugin).unit().chipId = 0x1A2B3C4D;
+    EXPECT_FALSE(parts(*plugin).calibration().loadQVTCalibration(false));
     ASSERT_EQ(VPDispatchPendingDelayed(), 1u);
 
     // The host lets go of the instance while the retry is pending.
-    CFUUIDRef factory = plugin->factoryID;
+    CFUUIDRef factory = parts(*plugin).factoryID();
     const long instances = VPPlugInInstanceCount(factory);
     plugin->Release();
     plugin = nullptr;
@@ -68,18 +68,18 @@ TEST_F(QVTStoreTest, RetryKeepsTheInstanceAliveAndLoadsOnceTheStoreIsReady)
 TEST_F(QVTStoreTest, WithoutDravikOSAMissingRecordIsNotRetried)
 {
     VPDispatchSetDelayMode(VPDelayMode::Manual);
-    EXPECT_FALSE(plugin->loadQVTCalibration(false));
+    EXPECT_FALSE(parts(*plugin).calibration().loadQVTCalibration(false));
     EXPECT_EQ(VPDispatchPendingDelayed(), 0u);
     EXPECT_EQ(countStartingWith("Retrieving QVT calibration data failed"), 0u);
     EXPECT_EQ(VPQVTReadCount(), 2u); // "XwCA", then "XwCl"
-    EXPECT_EQ(plugin->qvtRetryCount.load(), 0u);
+    EXPECT_EQ(parts(*plugin).calibration().storeRetries(), 0u);
 }
 
 TEST_F(QVTStoreTest, StoreErrorCountsAsNoRecord)
 {
     VPQVTSetFailure("XwCA", 5);
     writeStore("XwCl", ct::makeXwCl({}).vec());
-    EXPECT_TRUE(plugin->loadQVTCalibration(false));
+    EXPECT_TRUE(parts(*plugin).calibration().loadQVTCalibration(false));
     VPQVTSetFailure("XwCA", 0);
     EXPECT_EQ(countStartingWith("QVTDataCopy for key XwCA failed with error "), 1u);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "QVTDataCopy for key XwCl succeeded."));
@@ -91,7 +91,7 @@ TEST_F(QVTStoreTest, UnrecognisedLengthIsNotParsed)
     std::vector<uint8_t> record = ct::makeXwCl({}).vec();
     record.push_back(0);
     writeStore("XwCA", record);
-    EXPECT_FALSE(plugin->loadQVTCalibration(false));
+    EXPECT_FALSE(parts(*plugin).calibration().loadQVTCalibration(false));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "QVT calibration data length = 5157\n"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to parse ALS calibration data."));
     EXPECT_TRUE(received("ALSCalibrationData").empty());
@@ -101,11 +101,11 @@ TEST_F(QVTStoreTest, RefusedRecordFailsTheLoadAndMissingServiceDoesNot)
 {
     writeStore("XwCl", ct::makeXwCl({}).vec());
     VPServiceRefuseProperty(service, CFSTR("ALSCalibrationData"), true);
-    EXPECT_FALSE(plugin->loadQVTCalibration(false));
+    EXPECT_FALSE(parts(*plugin).calibration().loadQVTCalibration(false));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to set ALS calibration data."));
 
-    plugin->service = nullptr;
-    EXPECT_TRUE(plugin->loadQVTCalibration(false));
+    parts(*plugin).service() = nullptr;
+    EXPECT_TRUE(parts(*plugin).calibration().loadQVTCalibration(false));
 }
 
 } // namespace

@@ -23,10 +23,10 @@ protected:
 TEST_F(SpectrumExtractionTest, XwClColumnsAreTheStoredChannelsForChipType0)
 {
     const ct::Bytes record = ct::makeXwCl({.entries = 2});
-    plugin->chipType = 0;
-    plugin->numberOfChannels = 6;
+    parts(*plugin).unit().chipType = 0;
+    parts(*plugin).unit().numberOfChannels = 6;
     Matrices m = matrices(6);
-    ASSERT_TRUE(calib::extractXwClSpectrum(*plugin, record.vec(), 76 + 5080, m));
+    ASSERT_TRUE(calib::extractXwClSpectrum(parts(*plugin).calibration(), record.vec(), 76 + 5080, m));
     ASSERT_EQ(m.channelSpectra.size(), 401u * 6);
     for (unsigned s = 0; s < 401; ++s)
         for (unsigned c = 0; c < 6; ++c)
@@ -37,19 +37,19 @@ TEST_F(SpectrumExtractionTest, XwClColumnsAreTheStoredChannelsForChipType0)
         EXPECT_FLOAT_EQ(m.channelWeights[c], float(ct::xwcl::lux(1, c) / 65536.0));
     EXPECT_EQ(m.irCompensation, 0);
     EXPECT_EQ(m.nirFactor, 1.0f);
-    EXPECT_EQ(plugin->spectrumSampleCount.load(), 401u);
+    EXPECT_EQ(parts(*plugin).unit().spectrumSampleCount.load(), 401u);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Algo version: 0 NSamples: 401\n"));
 }
 
 TEST_F(SpectrumExtractionTest, XwClChipTypes1And2FoldTheFirstStoredChannel)
 {
     const ct::Bytes record = ct::makeXwCl({.deviceID = 62});
-    plugin->numberOfChannels = 6;
+    parts(*plugin).unit().numberOfChannels = 6;
     for (uint32_t chipType : {1u, 2u}) {
         SCOPED_TRACE(chipType);
-        plugin->chipType = chipType;
+        parts(*plugin).unit().chipType = chipType;
         Matrices m = matrices(5);
-        ASSERT_TRUE(calib::extractXwClSpectrum(*plugin, record.vec(), 76, m));
+        ASSERT_TRUE(calib::extractXwClSpectrum(parts(*plugin).calibration(), record.vec(), 76, m));
         for (unsigned s = 0; s < 401; ++s) {
             for (unsigned c = 0; c < 4; ++c)
                 ASSERT_EQ(at(m, s, c), ct::xwcl::sample(0, c + 1, s));
@@ -65,19 +65,19 @@ TEST_F(SpectrumExtractionTest, XwClChipTypes1And2FoldTheFirstStoredChannel)
 TEST_F(SpectrumExtractionTest, XwClColumnsBeyondTheEntryAreRejected)
 {
     const ct::Bytes record = ct::makeXwCl({});
-    plugin->numberOfChannels = 6;
-    plugin->chipType = 1;
+    parts(*plugin).unit().numberOfChannels = 6;
+    parts(*plugin).unit().chipType = 1;
     Matrices sixFolded = matrices(6); // would need a seventh stored channel
-    EXPECT_FALSE(calib::extractXwClSpectrum(*plugin, record.vec(), 76, sixFolded));
+    EXPECT_FALSE(calib::extractXwClSpectrum(parts(*plugin).calibration(), record.vec(), 76, sixFolded));
     EXPECT_TRUE(sixFolded.channelSpectra.empty());
 
-    plugin->chipType = 0;
-    plugin->numberOfChannels = 7;
+    parts(*plugin).unit().chipType = 0;
+    parts(*plugin).unit().numberOfChannels = 7;
     Matrices seven = matrices(7);
-    EXPECT_FALSE(calib::extractXwClSpectrum(*plugin, record.vec(), 76, seven));
+    EXPECT_FALSE(calib::extractXwClSpectrum(parts(*plugin).calibration(), record.vec(), 76, seven));
     Matrices past = matrices(5);
-    plugin->numberOfChannels = 5;
-    EXPECT_FALSE(calib::extractXwClSpectrum(*plugin, record.vec(), 76 + 5080, past)); // one entry only
+    parts(*plugin).unit().numberOfChannels = 5;
+    EXPECT_FALSE(calib::extractXwClSpectrum(parts(*plugin).calibration(), record.vec(), 76 + 5080, past)); // one entry only
     EXPECT_TRUE(past.channelWeights.empty());
 }
 
@@ -85,10 +85,10 @@ TEST_F(SpectrumExtractionTest, XwCAT2SpectraAre32BitWithWeightsOf31FractionBits)
 {
     const ct::Bytes record = ct::makeXwCA({});
     CFDataRef data = record.data();
-    plugin->numberOfChannels = 5;
-    plugin->chipType = 0;
+    parts(*plugin).unit().numberOfChannels = 5;
+    parts(*plugin).unit().chipType = 0;
     Matrices m = matrices(5);
-    ASSERT_TRUE(plugin->processQVTSpectrumXwCAT2(data, m));
+    ASSERT_TRUE(parts(*plugin).calibration().processQVTSpectrumXwCAT2(data, m));
     for (unsigned s = 0; s < 401; s += 40)
         for (unsigned c = 0; c < 5; ++c)
             EXPECT_EQ(at(m, s, c), ct::xwca::sample(c, s));
@@ -102,7 +102,7 @@ TEST_F(SpectrumExtractionTest, XwCAT2SpectraAre32BitWithWeightsOf31FractionBits)
     ct::Bytes wrong(100);
     data = wrong.data();
     Matrices untouched = matrices(5);
-    EXPECT_FALSE(plugin->processQVTSpectrumXwCAT2(data, untouched));
+    EXPECT_FALSE(parts(*plugin).calibration().processQVTSpectrumXwCAT2(data, untouched));
     EXPECT_TRUE(untouched.channelSpectra.empty());
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR,
                              "QVT calibration data doesn't match with size of VD6286 structure (length = 100)"));
@@ -113,9 +113,9 @@ TEST_F(SpectrumExtractionTest, VD6287SpectraAndWeightsComeFromTheFirstBlob)
 {
     const ct::Bytes record = ct::makeVD6287v3();
     CFDataRef data = record.data();
-    plugin->numberOfChannels = 5;
+    parts(*plugin).unit().numberOfChannels = 5;
     Matrices m = matrices(5);
-    ASSERT_TRUE(plugin->processQVTSpectrumVD6287_XwClv3(data, m));
+    ASSERT_TRUE(parts(*plugin).calibration().processQVTSpectrumVD6287_XwClv3(data, m));
     for (unsigned s = 0; s < 401; ++s)
         for (unsigned c = 0; c < 5; ++c)
             ASSERT_EQ(at(m, s, c), ct::vd::sample(0, c, s));
@@ -125,7 +125,7 @@ TEST_F(SpectrumExtractionTest, VD6287SpectraAndWeightsComeFromTheFirstBlob)
 
     ct::Bytes wrong(10440);
     data = wrong.data();
-    EXPECT_FALSE(plugin->processQVTSpectrumVD6287_XwClv3(data, m));
+    EXPECT_FALSE(parts(*plugin).calibration().processQVTSpectrumVD6287_XwClv3(data, m));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR,
                              "QVT calibration data doesn't match with size of VD6287 structure (length = 10440)"));
     CFRelease(data);

@@ -12,7 +12,7 @@ protected:
     {
         CFDataRef data = bytes.data();
         CFDataRef record = nullptr;
-        const bool parsed = plugin->processQVTCalibrationVD6287_XwClv3(data, record);
+        const bool parsed = parts(*plugin).calibration().processQVTCalibrationVD6287_XwClv3(data, record);
         if (ok)
             *ok = parsed;
         CFRelease(data);
@@ -22,7 +22,7 @@ protected:
     std::vector<uint8_t> convert(const Bytes& v1)
     {
         CFDataRef data = v1.data();
-        std::vector<uint8_t> v3 = ct::takeBytes(plugin->convertSorvelXwClv1Tov3(data));
+        std::vector<uint8_t> v3 = ct::takeBytes(parts(*plugin).calibration().convertSorvelXwClv1Tov3(data));
         CFRelease(data);
         return v3;
     }
@@ -152,14 +152,14 @@ TEST_F(VD6287FormatTest, ConversionCountsBeyondTheTablesAreRejected)
 
 TEST_F(VD6287FormatTest, DriverRecordFromBothBlobs)
 {
-    plugin->sensorType = 5;
+    parts(*plugin).unit().sensorType = 5;
     bool ok = false;
     EXPECT_BYTES_EQ(parse(ct::makeVD6287v3(5, false), &ok), expectedDriverRecord(5, false).vec());
     EXPECT_TRUE(ok);
-    EXPECT_EQ(plugin->sensorType.load(), 8u);
-    EXPECT_EQ(plugin->numberOfChannels.load(), 5u);
-    EXPECT_EQ(plugin->dbChannelCount.load(), 5u);
-    EXPECT_FLOAT_EQ(plugin->smallDBVersion.load(), 1.3f);
+    EXPECT_EQ(parts(*plugin).unit().sensorType.load(), 8u);
+    EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 5u);
+    EXPECT_EQ(parts(*plugin).unit().dbChannelCount.load(), 5u);
+    EXPECT_FLOAT_EQ(parts(*plugin).unit().smallDBVersion.load(), 1.3f);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "XwCl calibration version = v3.1\n"));
 }
 
@@ -194,8 +194,8 @@ TEST_F(VD6287FormatTest, RecordsOutsideTheFormatAreRejected)
         {sixGains, "Unexpected num_channels/num_gains!\n"},
         {ct::makeVD6287v3(8), "Calibration blob 0 holds 8 table entries, expected at most 7\n"},
     };
-    plugin->sensorType = 5;
-    plugin->numberOfChannels = 3;
+    parts(*plugin).unit().sensorType = 5;
+    parts(*plugin).unit().numberOfChannels = 3;
     for (const Case& c : cases) {
         SCOPED_TRACE(c.message);
         bool ok = true;
@@ -203,25 +203,25 @@ TEST_F(VD6287FormatTest, RecordsOutsideTheFormatAreRejected)
         EXPECT_FALSE(ok);
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, c.message));
     }
-    EXPECT_EQ(plugin->sensorType.load(), 5u);
-    EXPECT_EQ(plugin->numberOfChannels.load(), 3u);
+    EXPECT_EQ(parts(*plugin).unit().sensorType.load(), 5u);
+    EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 3u);
 }
 
 TEST_F(VD6287FormatTest, VersionOneRecordIsConvertedOnLoad)
 {
     writeStore("XwCA", versionOne(2).vec());
-    ASSERT_TRUE(plugin->loadQVTCalibration(false));
+    ASSERT_TRUE(parts(*plugin).calibration().loadQVTCalibration(false));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "QVT calibration data converted from v1 to v3. New size = 10348\n"));
     const std::vector<uint8_t> record = received("ALSCalibrationData");
     ASSERT_EQ(record.size(), 776u);
     EXPECT_EQ(ct::rd32(record, 4), 0xFFFFFFFFu);
     EXPECT_EQ(ct::rd32(record, 388 + 4), 0xFFFFFFFFu);
     EXPECT_EQ(record.at(308), 3);
-    EXPECT_EQ(plugin->sensorType.load(), 8u);
+    EXPECT_EQ(parts(*plugin).unit().sensorType.load(), 8u);
 
     // A count the tables cannot hold: the version-1 data matches no layout.
     writeStore("XwCA", versionOne(9).vec());
-    EXPECT_FALSE(plugin->loadQVTCalibration(false));
+    EXPECT_FALSE(parts(*plugin).calibration().loadQVTCalibration(false));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to parse ALS calibration data."));
 }
 

@@ -13,12 +13,12 @@ protected:
     void SetUp() override
     {
         CalibrationTest::SetUp();
-        plugin->chipId = 0x1A2B3C4D;
+        parts(*plugin).unit().chipId = 0x1A2B3C4D;
     }
     bool load(const XwCAShape& shape)
     {
         writeStore("XwCA", ct::makeXwCA(shape).vec());
-        return plugin->loadQVTCalibration(false);
+        return parts(*plugin).calibration().loadQVTCalibration(false);
     }
 };
 
@@ -68,9 +68,9 @@ TEST_F(XwCAT2FormatTest, TimingFollowsVersionAndModel)
         EXPECT_EQ(log.count(workaround), workarounds);
     }
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, workaround));
-    EXPECT_FLOAT_EQ(plugin->smallDBVersion.load(), 1.3f);
-    EXPECT_EQ(plugin->numberOfChannels.load(), 5u);
-    EXPECT_EQ(plugin->dbChannelCount.load(), 5u);
+    EXPECT_FLOAT_EQ(parts(*plugin).unit().smallDBVersion.load(), 1.3f);
+    EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 5u);
+    EXPECT_EQ(parts(*plugin).unit().dbChannelCount.load(), 5u);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "processQVTCalibrationXwCAT2: gain = 16, iTime = 180"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "processQVTCalibrationXwCAT2: luxCoeff[0]=0.007812, "
                                                   "cctCoeff[0]=-3.000000, offsetCounts[0]=-50/255 darkCounts[0] = -112"));
@@ -78,25 +78,25 @@ TEST_F(XwCAT2FormatTest, TimingFollowsVersionAndModel)
 
 TEST_F(XwCAT2FormatTest, ChipIdIsReadAsHexadecimalText)
 {
-    plugin->chipId = 0x4D3C2B1A;
+    parts(*plugin).unit().chipId = 0x4D3C2B1A;
     EXPECT_TRUE(load({}));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Chip_id is 0x1A2B3C4D"));
 
-    plugin->chipId = 1;
-    plugin->numberOfChannels = 3;
+    parts(*plugin).unit().chipId = 1;
+    parts(*plugin).unit().numberOfChannels = 3;
     EXPECT_FALSE(load({}));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Chip ID doesn't match - (device chip ID 0x00000001 != calibration "
                                                 "chip ID 0x1A2B3C4D and chip_id_reversed 0x4D3C2B1A)"));
-    EXPECT_EQ(plugin->numberOfChannels.load(), 3u);
+    EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 3u);
 }
 
 TEST_F(XwCAT2FormatTest, CountsBeyondTheRecordAreRejected)
 {
     for (const XwCAShape& shape : {XwCAShape{.nChannels = 6}, XwCAShape{.nGains = 6}, XwCAShape{.nChannels = 0}}) {
-        plugin->numberOfChannels = 3;
+        parts(*plugin).unit().numberOfChannels = 3;
         EXPECT_FALSE(load(shape));
         EXPECT_TRUE(received("ALSCalibrationData").empty());
-        EXPECT_EQ(plugin->numberOfChannels.load(), 3u);
+        EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 3u);
     }
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "XwCA calibration with 5 channels and 6 gains does not fit the "
                                                 "5-channel record -> calibration will be skipped.\n"));
@@ -107,7 +107,7 @@ TEST_F(XwCAT2FormatTest, WrongLengthLeavesTheRecordUntouched)
     Bytes shortRecord(9961);
     CFDataRef data = shortRecord.data();
     CFDataRef record = nullptr;
-    EXPECT_FALSE(plugin->processQVTCalibrationXwCAT2(data, record));
+    EXPECT_FALSE(parts(*plugin).calibration().processQVTCalibrationXwCAT2(data, record));
     EXPECT_EQ(record, nullptr);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR,
                              "QVT calibration data doesn't match with size of XwCA structure (length = 9961)\n"));

@@ -13,7 +13,7 @@ protected:
     bool load(const XwClShape& shape)
     {
         writeStore("XwCl", ct::makeXwCl(shape).vec());
-        return plugin->loadQVTCalibration(false);
+        return parts(*plugin).calibration().loadQVTCalibration(false);
     }
 };
 
@@ -87,13 +87,13 @@ TEST_F(XwClFormatTest, FiveChannelRecordComesFromTheFirstEntry)
         SCOPED_TRACE(int(device));
         const XwClShape shape{.entries = 2, .deviceID = device, .chipID = 0x11223344, .chipType = 1, .selector = 2,
                             .nChannels = 4, .nGains = 7};
-        plugin->chipId = 0x11223344;
+        parts(*plugin).unit().chipId = 0x11223344;
         ASSERT_TRUE(load(shape));
         EXPECT_BYTES_EQ(received("ALSCalibrationData"), fiveChannelRecord(shape, 0).vec());
-        EXPECT_FLOAT_EQ(plugin->smallDBVersion.load(), 1.3f);
-        EXPECT_EQ(plugin->chipType.load(), 1u);
-        EXPECT_EQ(plugin->numberOfChannels.load(), 4u);
-        EXPECT_EQ(plugin->dbChannelCount.load(), 4u);
+        EXPECT_FLOAT_EQ(parts(*plugin).unit().smallDBVersion.load(), 1.3f);
+        EXPECT_EQ(parts(*plugin).unit().chipType.load(), 1u);
+        EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 4u);
+        EXPECT_EQ(parts(*plugin).unit().dbChannelCount.load(), 4u);
     }
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Found Kestrow calibration"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Found Marlit calibration"));
@@ -109,15 +109,15 @@ TEST_F(XwClFormatTest, FourChannelRecordComesFromTheSelectedEntry)
         SCOPED_TRACE(int(device));
         const XwClShape shape{.entries = 2, .deviceID = device, .chipType = 2, .selector = 2, .nChannels = 4,
                             .nGains = 8};
-        plugin->chipType = 7;
+        parts(*plugin).unit().chipType = 7;
         ASSERT_TRUE(load(shape));
         EXPECT_BYTES_EQ(received("ALSCalibrationData"), fourChannelRecord(shape, 1).vec());
-        EXPECT_EQ(plugin->algoVersion.load(), 4);
-        EXPECT_EQ(plugin->lambdaConfigured.load(), 1);
-        EXPECT_FLOAT_EQ(plugin->lambda.load(), 0.01f);
-        EXPECT_EQ(plugin->numberOfChannels.load(), 4u);
-        EXPECT_EQ(plugin->dbChannelCount.load(), 4u);
-        EXPECT_EQ(plugin->chipType.load(), 7u); // this layout has no chip type
+        EXPECT_EQ(parts(*plugin).unit().algoVersion.load(), 4);
+        EXPECT_EQ(parts(*plugin).fit().lambdaConfigured.load(), 1);
+        EXPECT_FLOAT_EQ(parts(*plugin).fit().lambda.load(), 0.01f);
+        EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 4u);
+        EXPECT_EQ(parts(*plugin).unit().dbChannelCount.load(), 4u);
+        EXPECT_EQ(parts(*plugin).unit().chipType.load(), 7u); // this layout has no chip type
     }
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "luxCoeff[2]=200707/65536, offsetCounts[2]=-312/255"));
 }
@@ -130,10 +130,10 @@ TEST_F(XwClFormatTest, SixChannelRecordScalesColourTemperatureByChipType)
                             .nGains = 9};
         ASSERT_TRUE(load(shape));
         EXPECT_BYTES_EQ(received("ALSCalibrationData"), sixChannelRecord(shape, 0).vec());
-        EXPECT_FLOAT_EQ(plugin->smallDBVersion.load(), 1.2f);
-        EXPECT_EQ(plugin->chipType.load(), chipType);
-        EXPECT_EQ(plugin->numberOfChannels.load(), 6u);
-        EXPECT_EQ(plugin->dbChannelCount.load(), 5u);
+        EXPECT_FLOAT_EQ(parts(*plugin).unit().smallDBVersion.load(), 1.2f);
+        EXPECT_EQ(parts(*plugin).unit().chipType.load(), chipType);
+        EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 6u);
+        EXPECT_EQ(parts(*plugin).unit().dbChannelCount.load(), 5u);
     }
 }
 
@@ -143,19 +143,19 @@ TEST_F(XwClFormatTest, ChipIdMustMatch)
 {
     const XwClShape shape{.deviceID = 14, .chipID = 0x11223344};
     for (uint32_t sensor : {0x11223344u, 0x44332211u}) {
-        plugin->chipId = sensor;
+        parts(*plugin).unit().chipId = sensor;
         EXPECT_TRUE(load(shape)) << std::hex << sensor;
     }
-    plugin->chipId = 0;
+    parts(*plugin).unit().chipId = 0;
     EXPECT_TRUE(load({.deviceID = 14, .chipID = 0}));
 
     const size_t sent = VPServiceReceivedCount(service, CFSTR("ALSCalibrationData"));
-    plugin->publishDatabase(std::make_shared<const SpectralDatabase>(), true);
+    parts(*plugin).databases().publish(std::make_shared<const SpectralDatabase>(), true);
     for (uint32_t sensor : {0u, 0x11223345u}) {
-        plugin->chipId = sensor;
+        parts(*plugin).unit().chipId = sensor;
         EXPECT_FALSE(load(shape)) << std::hex << sensor;
     }
-    EXPECT_FALSE(plugin->isDbReady());
+    EXPECT_FALSE(parts(*plugin).databases().isReady());
     EXPECT_EQ(VPServiceReceivedCount(service, CFSTR("ALSCalibrationData")), sent);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "ID in QVT calibration (0x11223344) doesn't match with chip ID (0x0) "
                                                 "-> calibration will be skipped.\n"));
@@ -180,11 +180,11 @@ TEST_F(XwClFormatTest, RecordsThatDoNotFitTheirLayoutAreRejected)
         SCOPED_TRACE(testing::Message() << "device " << int(shape.deviceID) << " selector " << int(shape.selector)
                                         << " channels " << int(shape.nChannels) << " gains " << int(shape.nGains));
         log.clear();
-        plugin->numberOfChannels = 3;
+        parts(*plugin).unit().numberOfChannels = 3;
         EXPECT_FALSE(load(shape));
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to parse ALS calibration data."));
         EXPECT_TRUE(received("ALSCalibrationData").empty());
-        EXPECT_EQ(plugin->numberOfChannels.load(), 3u);
+        EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 3u);
     }
 
     log.clear();

@@ -4,7 +4,7 @@
 // plug-in instance made by the factory.
 #pragma once
 
-#include "plugin/VantishPlugIn.h"
+#include "plugin/TestAccess.h"
 
 #include <IOKit/hid/IOHIDEvent.h>
 #include <IOKit/hid/IOHIDServiceFilterPlugIn.h>
@@ -138,17 +138,17 @@ inline CFIndex colourSpaceOf(IOHIDEventRef event)
 
 inline void setLastXYZ(VantishPlugIn& plugin, float x, float y, float z)
 {
-    plugin.lastXYZ[0] = x;
-    plugin.lastXYZ[1] = y;
-    plugin.lastXYZ[2] = z;
+    parts(plugin).lastXYZ()[0] = x;
+    parts(plugin).lastXYZ()[1] = y;
+    parts(plugin).lastXYZ()[2] = z;
 }
 
 inline void overrideChromaticity(VantishPlugIn& plugin, double x, double y, double luminance)
 {
-    plugin.chromaticityOverrideActive = 1;
-    plugin.overrideX = x;
-    plugin.overrideY = y;
-    plugin.overrideLuminance = luminance;
+    parts(plugin).overrides().chromaticityOverrideActive = 1;
+    parts(plugin).overrides().overrideX = x;
+    parts(plugin).overrides().overrideY = y;
+    parts(plugin).overrides().overrideLuminance = luminance;
 }
 
 // An exactly linear database (X = ch0, Y = ch1 + ch2, Z = ch3 + ch4), so the
@@ -171,9 +171,9 @@ inline SpectralDatabasePtr linearDatabase(uint32_t channels)
     return db;
 }
 
-inline std::array<float, 3> lastXYZOf(const VantishPlugIn& plugin)
+inline std::array<float, 3> lastXYZOf(VantishPlugIn& plugin)
 {
-    return {plugin.lastXYZ[0].load(), plugin.lastXYZ[1].load(), plugin.lastXYZ[2].load()};
+    return {parts(plugin).lastXYZ()[0].load(), parts(plugin).lastXYZ()[1].load(), parts(plugin).lastXYZ()[2].load()};
 }
 
 // A plug-in instance from the factory, released with the holder.

@@ -40,7 +40,7 @@ protected:
     {
         std::array<uint32_t, 6> out{};
         for (size_t i = 0; i < 6; ++i)
-            out[i] = plugin_->rgbcOverride[i].load();
+            out[i] = parts(*plugin_).overrides().rgbcOverride[i].load();
         return out;
     }
 };
@@ -49,16 +49,16 @@ TEST_F(ClientProperties, RGBCOverrideOffAndOnKeepsTheValues)
 {
     vt::LogCapture log;
     set("RGBCOverride", array({integer(10), integer(20), integer(30), integer(40)}));
-    EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 1);
+    EXPECT_EQ(parts(*plugin_).overrides().rgbcOverrideActive.load(), 1);
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{10, 20, 30, 40, 0, 0}));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Override ch[0]: 10"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Override ch[3]: 40"));
 
     set("RGBCOverride", integer(0));
-    EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 0);
+    EXPECT_EQ(parts(*plugin_).overrides().rgbcOverrideActive.load(), 0);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "RGBC override turned off"));
     set("RGBCOverride", integer(1));
-    EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 1);
+    EXPECT_EQ(parts(*plugin_).overrides().rgbcOverrideActive.load(), 1);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "RGBC override turned on"));
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{10, 20, 30, 40, 0, 0}));
 }
@@ -66,20 +66,20 @@ TEST_F(ClientProperties, RGBCOverrideOffAndOnKeepsTheValues)
 TEST_F(ClientProperties, RGBCArraysTakeOnlyNumbersAndTheDatabasesChannelCount)
 {
     vt::LogCapture log;
-    plugin_->dbChannelCount = 5;
+    parts(*plugin_).unit().dbChannelCount = 5;
     set("RGBCOverride", array({integer(1), integer(2), integer(3), integer(4)}));
     set("RGBCOverride", string("1,2,3,4,5"));
-    EXPECT_EQ(plugin_->rgbcOverrideActive.load(), 0);
+    EXPECT_EQ(parts(*plugin_).overrides().rgbcOverrideActive.load(), 0);
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{}));
     EXPECT_TRUE(log.lines().empty());
 
-    plugin_->dbChannelCount = 4;
+    parts(*plugin_).unit().dbChannelCount = 4;
     set("RGBCOverride", array({integer(1), integer(2), integer(3), integer(4)}));
     set("RGBCOverride", array({integer(11), string("x"), CFRetain(kCFBooleanTrue), integer(44)}));
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{11, 2, 3, 44, 0, 0}));
 
     // Never stored past six values.
-    plugin_->dbChannelCount = 8;
+    parts(*plugin_).unit().dbChannelCount = 8;
     set("RGBCOverride", array({integer(1), integer(2), integer(3), integer(4), integer(5), integer(6), integer(7),
                                integer(8)}));
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{1, 2, 3, 4, 5, 6}));
@@ -90,53 +90,53 @@ TEST_F(ClientProperties, RGBCArraysTakeOnlyNumbersAndTheDatabasesChannelCount)
 TEST_F(ClientProperties, ChromaticityWithTwoOrThreeValues)
 {
     vt::LogCapture log;
-    plugin_->overrideLuminance = 50.0;
+    parts(*plugin_).overrides().overrideLuminance = 50.0;
     set("ChromaticityOverride", array({number(0.3127), number(0.3290)}));
-    EXPECT_EQ(plugin_->chromaticityOverrideActive.load(), 1);
-    EXPECT_DOUBLE_EQ(plugin_->overrideX.load(), 0.3127);
-    EXPECT_DOUBLE_EQ(plugin_->overrideY.load(), 0.3290);
-    EXPECT_DOUBLE_EQ(plugin_->overrideLuminance.load(), -1.0);
+    EXPECT_EQ(parts(*plugin_).overrides().chromaticityOverrideActive.load(), 1);
+    EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideX.load(), 0.3127);
+    EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideY.load(), 0.3290);
+    EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideLuminance.load(), -1.0);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Override x: 0.31"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Override y: 0.33"));
 
     set("ChromaticityOverride", array({number(0.45), number(0.41), number(120.0)}));
-    EXPECT_DOUBLE_EQ(plugin_->overrideX.load(), 0.45);
-    EXPECT_DOUBLE_EQ(plugin_->overrideLuminance.load(), 120.0);
+    EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideX.load(), 0.45);
+    EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideLuminance.load(), 120.0);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Override Y: 120.00"));
 
     set("ChromaticityOverride", integer(0));
-    EXPECT_EQ(plugin_->chromaticityOverrideActive.load(), 0);
+    EXPECT_EQ(parts(*plugin_).overrides().chromaticityOverrideActive.load(), 0);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Chromaticity (xyY) override turned off"));
-    EXPECT_DOUBLE_EQ(plugin_->overrideY.load(), 0.41);
+    EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideY.load(), 0.41);
 }
 
 TEST_F(ClientProperties, ChromaticityIgnoresShortArraysAndNonNumbers)
 {
     set("ChromaticityOverride", array({number(0.3)}));
-    EXPECT_EQ(plugin_->chromaticityOverrideActive.load(), 0);
+    EXPECT_EQ(parts(*plugin_).overrides().chromaticityOverrideActive.load(), 0);
 
-    plugin_->overrideX = 0.2;
-    plugin_->overrideLuminance = 7.0;
+    parts(*plugin_).overrides().overrideX = 0.2;
+    parts(*plugin_).overrides().overrideLuminance = 7.0;
     set("ChromaticityOverride", array({string("x"), number(0.3), string("Y"), number(9.0)}));
-    EXPECT_EQ(plugin_->chromaticityOverrideActive.load(), 1);
-    EXPECT_DOUBLE_EQ(plugin_->overrideX.load(), 0.2);
-    EXPECT_DOUBLE_EQ(plugin_->overrideY.load(), 0.3);
-    EXPECT_DOUBLE_EQ(plugin_->overrideLuminance.load(), 7.0);
+    EXPECT_EQ(parts(*plugin_).overrides().chromaticityOverrideActive.load(), 1);
+    EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideX.load(), 0.2);
+    EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideY.load(), 0.3);
+    EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideLuminance.load(), 7.0);
 }
 
 TEST_F(ClientProperties, TuningValuesAndUnknownKeys)
 {
     vt::LogCapture log;
     set("ColorAlgoLambda", number(0.05));
-    EXPECT_FLOAT_EQ(plugin_->lambda.load(), 0.05f);
-    EXPECT_EQ(plugin_->lambdaConfigured.load(), 0); // a client lambda does not switch on normalisation
+    EXPECT_FLOAT_EQ(parts(*plugin_).fit().lambda.load(), 0.05f);
+    EXPECT_EQ(parts(*plugin_).fit().lambdaConfigured.load(), 0); // a client lambda does not switch on normalisation
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Setting lambda 0.050000."));
     set("ColorAlgoLambda", string("0.5"));
-    EXPECT_FLOAT_EQ(plugin_->lambda.load(), 0.05f);
+    EXPECT_FLOAT_EQ(parts(*plugin_).fit().lambda.load(), 0.05f);
 
     set("ChannelRatioMitigationType", integer(3));
-    EXPECT_EQ(plugin_->mitigationType.load(), 3u);
-    EXPECT_EQ(plugin_->channelRatioMitigation.load(), 0);
+    EXPECT_EQ(parts(*plugin_).unit().mitigationType.load(), 3u);
+    EXPECT_EQ(parts(*plugin_).unit().channelRatioMitigation.load(), 0);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Setting channel ratio mitigation type 3."));
 
     log.clear();
@@ -159,7 +159,7 @@ TEST_F(ClientProperties, RebuildRunsOnTheCallersThread)
           Case{kCFBooleanFalse, kCFBooleanTrue, "Don't use sysconfig calibration to calibrate sensor\n", false}}) {
         SCOPED_TRACE(c.line);
         std::filesystem::remove(cacheFile());
-        plugin_->setDbReady(false);
+        parts(*plugin_).databases().setReady(false);
         vt::LogCapture log;
         VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), c.sysConfig);
         VPServicePublishProperty(service_, CFSTR("ALSCalibrationSpectrumToProcess"), c.spectrumToProcess);
@@ -167,7 +167,7 @@ TEST_F(ClientProperties, RebuildRunsOnTheCallersThread)
         set("RebuildVelderDB", c.withValue ? integer(1) : nullptr);
         // Done before the call returned: nothing was queued for the cache.
         EXPECT_TRUE(std::filesystem::exists(cacheFile()));
-        EXPECT_TRUE(plugin_->isDbReady());
+        EXPECT_TRUE(parts(*plugin_).databases().isReady());
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Rebuild databases."));
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, c.line));
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Databases were rebuilt successfully."));
@@ -189,7 +189,7 @@ TEST_F(ClientProperties, FailedRebuilds)
         EXPECT_FALSE(log.contains("Databases were rebuilt successfully."));
     }
     VPQVTSetStoreDirectory("");
-    EXPECT_FALSE(plugin_->isDbReady());
+    EXPECT_FALSE(parts(*plugin_).databases().isReady());
 }
 
 } // namespace

@@ -15,8 +15,8 @@ class CopyEvent : public ::testing::Test {
 protected:
     void SetUp() override
     {
-        plugin->numberOfChannels = 4;
-        plugin->dbChannelCount = 4;
+        parts(*plugin).unit().numberOfChannels = 4;
+        parts(*plugin).unit().dbChannelCount = 4;
         setLastXYZ(*plugin, 1, 2, 3);
     }
     size_t linesContaining(const std::string& part)
@@ -33,7 +33,7 @@ protected:
 
 TEST_F(CopyEvent, ColourSpaceZeroGetsTheLastResult)
 {
-    plugin->setDbReady(true);
+    parts(*plugin).databases().setReady(true);
     auto event = createALSEvent(nullptr);
     EXPECT_EQ(plugin->filterCopyEvent(event.get()), event.get());
     EXPECT_EQ(colourSpaceOf(event.get()), 1);
@@ -43,7 +43,7 @@ TEST_F(CopyEvent, ColourSpaceZeroGetsTheLastResult)
 
 TEST_F(CopyEvent, AColourAlreadyThereIsKept)
 {
-    plugin->setDbReady(true);
+    parts(*plugin).databases().setReady(true);
     auto event = createALSEvent(nullptr);
     IOHIDEventSetDoubleValue(event.get(), kIOHIDEventFieldAmbientLightColorComponent0, 7.5);
     IOHIDEventSetDoubleValue(event.get(), kIOHIDEventFieldAmbientLightColorComponent1, 8.5);
@@ -57,7 +57,7 @@ TEST_F(CopyEvent, AColourAlreadyThereIsKept)
 
 TEST_F(CopyEvent, ChromaticityOverrideAppliesToCopies)
 {
-    plugin->setDbReady(true);
+    parts(*plugin).databases().setReady(true);
     overrideChromaticity(*plugin, 0.3127, 0.3290, 100.0);
     auto event = createALSEvent(nullptr);
     plugin->filterCopyEvent(event.get());
@@ -87,7 +87,7 @@ TEST_F(CopyEvent, NothingChangesWithoutADatabaseOrForOtherEvents)
     EXPECT_EQ(colourSpaceOf(event.get()), 0);
     EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{}));
 
-    plugin->setDbReady(true);
+    parts(*plugin).databases().setReady(true);
     IOHIDEventRef other = IOHIDEventCreate(kCFAllocatorDefault, kIOHIDEventTypeVendorDefined, 0, 0);
     EXPECT_EQ(plugin->filterCopyEvent(other), other);
     EXPECT_EQ(IOHIDEventGetIntegerValue(other, kIOHIDEventFieldAmbientLightColorSpace), 0);
@@ -100,8 +100,8 @@ TEST_F(CopyEvent, NothingChangesWithoutADatabaseOrForOtherEvents)
 
 TEST_F(CopyEvent, VD6287CopiesGoThroughTheWholeFilter)
 {
-    plugin->publishDatabase(linearDatabase(4), true);
-    plugin->sensorType = eALSSensorTypeVD6287;
+    parts(*plugin).databases().publish(linearDatabase(4), true);
+    parts(*plugin).unit().sensorType = eALSSensorTypeVD6287;
 
     Record record;
     record.sampleChannelCount(4).lux(50.0f).channels({20, 30, 40, 50, 0, 0}).xyzInRecord(1).xyzResult({-1, -1, -1});

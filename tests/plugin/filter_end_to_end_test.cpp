@@ -115,10 +115,10 @@ TEST(FilterEndToEnd, CountsOfAKnownSourceGiveItsChromaticityAtTheRecordsLux)
 {
     const auto all = sources();
     PlugIn plugin;
-    plugin->numberOfChannels = kChannels;
-    plugin->dbChannelCount = kChannels;
-    plugin->sensorType = 5;
-    plugin->publishDatabase(database(all), true);
+    parts(*plugin).unit().numberOfChannels = kChannels;
+    parts(*plugin).unit().dbChannelCount = kChannels;
+    parts(*plugin).unit().sensorType = 5;
+    parts(*plugin).databases().publish(database(all), true);
 
     // The source's own database entry dominates the fit, so its chromaticity
     // comes back to float precision (about 1e-7 measured); 1e-5 leaves room.

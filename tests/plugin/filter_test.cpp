@@ -33,18 +33,18 @@ class Filter : public ::testing::Test {
 protected:
     void SetUp() override
     {
-        plugin->numberOfChannels = 4;
-        plugin->dbChannelCount = 4;
-        plugin->sensorType = 1;
-        plugin->publishDatabase(linearDatabase(4), true);
+        parts(*plugin).unit().numberOfChannels = 4;
+        parts(*plugin).unit().dbChannelCount = 4;
+        parts(*plugin).unit().sensorType = 1;
+        parts(*plugin).databases().publish(linearDatabase(4), true);
     }
 
     void useSixChannelSensor()
     {
-        plugin->numberOfChannels = 6;
-        plugin->dbChannelCount = 5;
-        plugin->sensorType = 3;
-        plugin->publishDatabase(linearDatabase(5), true);
+        parts(*plugin).unit().numberOfChannels = 6;
+        parts(*plugin).unit().dbChannelCount = 5;
+        parts(*plugin).unit().sensorType = 3;
+        parts(*plugin).databases().publish(linearDatabase(5), true);
     }
 
     Event filter(const Record& record)
@@ -71,7 +71,7 @@ TEST_F(Filter, ChromaticityOverrideWritesLevelIlluminanceAndColourWithOrWithoutD
     overrideChromaticity(*plugin, 0.3127, 0.3290, 100.0);
     setLastXYZ(*plugin, 1, 2, 3);
     for (bool ready : {false, true}) {
-        plugin->setDbReady(ready);
+        parts(*plugin).databases().setReady(ready);
         Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, 500));
         EXPECT_DOUBLE_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel), 100.0);
         EXPECT_DOUBLE_EQ(IOHIDEventGetDoubleValue(event.get(), kIOHIDEventFieldAmbientLightSensorIlluminance), 100.0);
@@ -97,8 +97,8 @@ TEST_F(Filter, ChromaticityOverrideWithoutLuminanceUsesTheEventsIlluminance)
 
 TEST_F(Filter, SpikeBelowTheLuxLimitZeroesLevelAndColourAndLogs)
 {
-    plugin->channelRatioMitigation = 1;
-    plugin->mitigationType = 3;
+    parts(*plugin).unit().channelRatioMitigation = 1;
+    parts(*plugin).unit().mitigationType = 3;
     setLastXYZ(*plugin, 1, 2, 3);
     vt::LogCapture log;
 
@@ -123,10 +123,10 @@ TEST_F(Filter, SpikeBelowTheLuxLimitZeroesLevelAndColourAndLogs)
 TEST_F(Filter, SpikeTestsSeeRawNegativeChannels)
 {
     // Five channels, c1 = -60: a spike on the raw values (ratio 1.5), none once clamped.
-    plugin->numberOfChannels = 5;
-    plugin->publishDatabase(linearDatabase(5), true);
-    plugin->channelRatioMitigation = 1;
-    plugin->mitigationType = 1;
+    parts(*plugin).unit().numberOfChannels = 5;
+    parts(*plugin).databases().publish(linearDatabase(5), true);
+    parts(*plugin).unit().channelRatioMitigation = 1;
+    parts(*plugin).unit().mitigationType = 1;
     Event event = filter(Record().sampleChannelCount(5).channels({100, -60, 10, 10, 10, 0}).lux(5));
     EXPECT_EQ(IOHIDEventGetFloatValue(event.get(), kIOHIDEventFieldAmbientLightSensorLevel), 0.0);
     EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{0, 0, 0}));
@@ -145,7 +145,7 @@ TEST_F(Filter, ChannelsReachingTheColour)
     const Case cases[] = {
         // (10, 0 + 20, 30) scaled to 100 lux; unclamped it would be (5, 15, 30).
         {"negative channels count as zero", [] {}, fourChannels({10, -5, 20, 30, 0, 0}, 100), {50, 100, 150}},
-        {"stale database channel count", [this] { plugin->dbChannelCount = 5; },
+        {"stale database channel count", [this] { parts(*plugin).unit().dbChannelCount = 5; },
          fourChannels({10, 20, 30, 40, 0, 0}, 100), {20, 100, 80}},
         {"chromaticity override with y = 0 is ignored", [this] { overrideChromaticity(*plugin, 0.3127, 0.0, 100.0); },
          fourChannels({10, 20, 30, 40, 0, 0}, 100), {20, 100, 80}},
@@ -193,7 +193,7 @@ TEST_F(Filter, SampleDetailsAreLoggedExceptForSensorType8)
                              "gain=4.500000 XYZ=[0.000000;0.000000;0.000000] "
                              "Channels=[0.000000;0.000000;0.000000;0.000000;0.000000;7.000000]"));
     log.clear();
-    plugin->sensorType = 8;
+    parts(*plugin).unit().sensorType = 8;
     filter(record);
     for (const auto& message : log.messages())
         EXPECT_EQ(message.rfind("lux=", 0), std::string::npos) << message;
@@ -216,9 +216,9 @@ TEST_F(Filter, RGBCOverrideReplacesChannelsInColourRecordAndRawFields)
         {true, Record().sampleChannelCount(6).channels({-7, 1, 2, 3, 4, 5}).lux(50), {0, 100, 200, 300, 400, 500},
          {10, 50, 90}},
     };
-    plugin->rgbcOverrideActive = 1;
+    parts(*plugin).overrides().rgbcOverrideActive = 1;
     for (uint32_t i = 0; i < 6; ++i)
-        plugin->rgbcOverride[i] = 100 * (i + 1);
+        parts(*plugin).overrides().rgbcOverride[i] = 100 * (i + 1);
     for (const Case& c : cases) {
         SCOPED_TRACE(c.sixChannels);
         if (c.sixChannels)
@@ -272,7 +272,7 @@ TEST_F(Filter, XYZInRecordWritesTheResultAndComparesWithTheSensor)
 TEST_F(Filter, UnknownSensorChannelCountGivesZeroColourEveryTime)
 {
     for (uint32_t channels : {3u, 7u}) {
-        plugin->numberOfChannels = channels;
+        parts(*plugin).unit().numberOfChannels = channels;
         setLastXYZ(*plugin, 1, 2, 3);
         vt::LogCapture log;
         Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, 100));
@@ -291,9 +291,9 @@ TEST_F(Filter, DatabaseWithMoreChannelsThanTheSensorGivesZeroColour)
         uint32_t sensorChannels, dbChannels;
     };
     for (auto [sensorChannels, dbChannels] : {Case{4, 5}, Case{6, 7}, Case{5, 9}}) {
-        plugin->numberOfChannels = sensorChannels;
-        plugin->publishDatabase(linearDatabase(dbChannels), true);
-        plugin->rgbcOverrideActive = 1;
+        parts(*plugin).unit().numberOfChannels = sensorChannels;
+        parts(*plugin).databases().publish(linearDatabase(dbChannels), true);
+        parts(*plugin).overrides().rgbcOverrideActive = 1;
         setLastXYZ(*plugin, 1, 2, 3);
         vt::LogCapture log;
         Event event = filter(Record().sampleChannelCount(uint8_t(sensorChannels)).channels({1, 2, 3, 4, 5, 6}).lux(9));
@@ -317,7 +317,7 @@ TEST_F(Filter, EventsWithoutRecordOrDatabasePassUnchanged)
     plugin->filter(bare.get(), false);
     EXPECT_EQ(colourSpaceOf(bare.get()), 0);
 
-    plugin->setDbReady(false);
+    parts(*plugin).databases().setReady(false);
     Event notReady = filter(fourChannels({10, 20, 30, 40, 0, 0}, 100));
     EXPECT_EQ(colourSpaceOf(notReady.get()), 0);
     EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{1, 2, 3}));

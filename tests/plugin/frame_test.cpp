@@ -1,7 +1,7 @@
 // The plug-in object as the host sees it: factory, interface queries,
 // reference counting, and the log handles.
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
+#include "plugin/TestAccess.h"
 #include "support/TestSupport.h"
 
 #include <VantishPlatform/DeviceState.h>
@@ -18,6 +18,12 @@ CFUUIDRef factoryUUID()
 {
     return CFUUIDGetConstantUUIDWithBytes(kCFAllocatorSystemDefault, 0xD1, 0x14, 0x8F, 0xE3, 0x60, 0xF3, 0x4B, 0x3B,
                                           0x85, 0x05, 0xE2, 0x8C, 0x1E, 0x66, 0xEB, 0xC8);
+}
+
+// The table as the host reaches it: through the instance pointer.
+IOHIDServiceFilterPlugInInterface* table(VantishPlugIn* plugin)
+{
+    return *reinterpret_cast<IOHIDServiceFilterPlugInInterface**>(plugin);
 }
 
 VantishPlugIn* create()
@@ -62,19 +68,19 @@ TEST(QueryInterface, AcceptsTheThreeInterfacesAndCountsThem)
     VantishPlugIn* plugin = create();
     for (CFUUIDRef iid : {kIOHIDServiceFilterPlugInInterfaceID, kIOHIDServiceFilterPlugInInterfaceID2, IUnknownUUID}) {
         void* out = nullptr;
-        const ULONG before = plugin->refCount;
-        EXPECT_EQ(plugin->interfaceTable->QueryInterface(plugin, CFUUIDGetUUIDBytes(iid), &out), S_OK);
+        const ULONG before = parts(*plugin).refCount();
+        EXPECT_EQ(table(plugin)->QueryInterface(plugin, CFUUIDGetUUIDBytes(iid), &out), S_OK);
         EXPECT_EQ(out, plugin);
-        EXPECT_EQ(plugin->refCount, before + 1);
+        EXPECT_EQ(parts(*plugin).refCount(), before + 1);
     }
-    EXPECT_EQ(plugin->refCount, 4u);
+    EXPECT_EQ(parts(*plugin).refCount(), 4u);
     for (int i = 0; i < 3; ++i)
         plugin->Release();
 
     void* out = plugin;
     EXPECT_EQ(plugin->QueryInterface(CFUUIDGetUUIDBytes(kIOHIDServiceFilterPlugInTypeID), &out), E_NOINTERFACE);
     EXPECT_EQ(out, nullptr);
-    EXPECT_EQ(plugin->refCount, 1u);
+    EXPECT_EQ(parts(*plugin).refCount(), 1u);
     EXPECT_EQ(plugin->Release(), 0u);
 }
 
@@ -84,13 +90,13 @@ TEST(ReferenceCount, SecondReleaseFreesInstanceAndDatabase)
     auto db = std::make_shared<SpectralDatabase>();
     db->allocate(10, 4);
     std::weak_ptr<const SpectralDatabase> watch = db;
-    plugin->publishDatabase(db, true);
+    parts(*plugin).databases().publish(db, true);
     db.reset();
 
-    EXPECT_EQ(plugin->interfaceTable->AddRef(plugin), 2u);
-    EXPECT_EQ(plugin->interfaceTable->Release(plugin), 1u);
+    EXPECT_EQ(table(plugin)->AddRef(plugin), 2u);
+    EXPECT_EQ(table(plugin)->Release(plugin), 1u);
     EXPECT_FALSE(watch.expired());
-    EXPECT_EQ(plugin->interfaceTable->Release(plugin), 0u);
+    EXPECT_EQ(table(plugin)->Release(plugin), 0u);
     EXPECT_TRUE(watch.expired());
 }
 
@@ -99,10 +105,10 @@ TEST(ReferenceCount, QueuedWorkKeepsTheInstanceAlive)
     VPDispatchSetDelayMode(VPDelayMode::Manual);
     VantishPlugIn* plugin = create();
     std::atomic<uint32_t> seen{0};
-    plugin->dispatchAfterRetained(dispatch_time(DISPATCH_TIME_NOW, 5 * int64_t(NSEC_PER_SEC)),
+    parts(*plugin).calibration().host().dispatchAfterRetained(dispatch_time(DISPATCH_TIME_NOW, 5 * int64_t(NSEC_PER_SEC)),
                                   dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_HIGH, 0),
-                                  [plugin, &seen] { seen = plugin->orientation.load(); });
-    plugin->orientation = 7;
+                                  [plugin, &seen] { seen = parts(*plugin).unit().orientation.load(); });
+    parts(*plugin).unit().orientation = 7;
     EXPECT_EQ(plugin->Release(), 1u); // the host lets go; the queued work still holds it
     EXPECT_EQ(VPDispatchFireDelayed(), 1u);
     VPDispatchDrain();
@@ -123,7 +129,7 @@ TEST(ReferenceCount, ConcurrentAddRefReleaseIsExact)
         });
     for (auto& t : threads)
         t.join();
-    EXPECT_EQ(plugin->refCount, 1u);
+    EXPECT_EQ(parts(*plugin).refCount(), 1u);
     plugin->Release();
 }
 
@@ -165,7 +171,7 @@ TEST(Construction, TimebaseGivesSecondsPerTick)
 {
     VPSetTimebase(125, 3);
     VantishPlugIn* plugin = create();
-    EXPECT_DOUBLE_EQ(plugin->machTimeToSeconds, 125.0 / 3.0 * 1e-9);
+    EXPECT_DOUBLE_EQ(parts(*plugin).machTimeToSeconds(), 125.0 / 3.0 * 1e-9);
     plugin->Release();
     VPSetTimebase(1, 1);
 }

@@ -1,5 +1,5 @@
 // Matching services and reading the configuration at open.
-#include "plugin/VantishPlugIn.h"
+#include "plugin/TestAccess.h"
 #include "support/TestSupport.h"
 
 #include <VantishPlatform/DeviceState.h>
@@ -132,19 +132,19 @@ TEST_F(Open, ReadsEveryConfigurationKey)
 
     vt::LogCapture log;
     plugin->open(service, 0);
-    EXPECT_EQ(plugin->orientation, 3u);
-    EXPECT_EQ(plugin->colorAlgoOverride, 5);
-    EXPECT_FLOAT_EQ(plugin->lambda, 0.25f);
-    EXPECT_EQ(plugin->lambdaConfigured, 1);
-    EXPECT_EQ(plugin->numberOfChannels, 6u);
-    EXPECT_EQ(plugin->dbChannelCount, 5u);
-    EXPECT_EQ(plugin->mitigationType, 3u);
-    EXPECT_EQ(plugin->channelRatioMitigation, 1);
-    EXPECT_EQ(plugin->chipId, 0x1234u);
-    EXPECT_EQ(plugin->sensorType, 3u);
-    EXPECT_EQ(plugin->isDravikOS, 1);
-    EXPECT_EQ(plugin->deviceColor, 2u);
-    EXPECT_EQ(plugin->service, service);
+    EXPECT_EQ(parts(*plugin).unit().orientation, 3u);
+    EXPECT_EQ(parts(*plugin).unit().colorAlgoOverride, 5);
+    EXPECT_FLOAT_EQ(parts(*plugin).fit().lambda, 0.25f);
+    EXPECT_EQ(parts(*plugin).fit().lambdaConfigured, 1);
+    EXPECT_EQ(parts(*plugin).unit().numberOfChannels, 6u);
+    EXPECT_EQ(parts(*plugin).unit().dbChannelCount, 5u);
+    EXPECT_EQ(parts(*plugin).unit().mitigationType, 3u);
+    EXPECT_EQ(parts(*plugin).unit().channelRatioMitigation, 1);
+    EXPECT_EQ(parts(*plugin).unit().chipId, 0x1234u);
+    EXPECT_EQ(parts(*plugin).unit().sensorType, 3u);
+    EXPECT_EQ(parts(*plugin).unit().isDravikOS, 1);
+    EXPECT_EQ(parts(*plugin).unit().deviceColor, 2u);
+    EXPECT_EQ(parts(*plugin).service(), service);
 
     for (const char* line : {"IONameMatched=als,ct720 \n", "DeviceColor is 2", "Color algo override version = 5 from EDT\n",
                              "Setting color algo lambda = 0.250000 from EDT\n", "Use channel ratio mitigation - YES, type = 3\n",
@@ -164,13 +164,13 @@ TEST_F(Open, AbsentAndMistypedValuesKeepTheDefaults)
 
     vt::LogCapture log;
     plugin->open(service, 0);
-    EXPECT_EQ(plugin->orientation, 1u);
-    EXPECT_EQ(plugin->colorAlgoOverride, 0);
-    EXPECT_EQ(plugin->lambdaConfigured, 0);
-    EXPECT_EQ(plugin->numberOfChannels, 0u);
-    EXPECT_EQ(plugin->channelRatioMitigation, 0);
-    EXPECT_EQ(plugin->deviceColor, 0u);
-    EXPECT_EQ(plugin->isDravikOS, 0);
+    EXPECT_EQ(parts(*plugin).unit().orientation, 1u);
+    EXPECT_EQ(parts(*plugin).unit().colorAlgoOverride, 0);
+    EXPECT_EQ(parts(*plugin).fit().lambdaConfigured, 0);
+    EXPECT_EQ(parts(*plugin).unit().numberOfChannels, 0u);
+    EXPECT_EQ(parts(*plugin).unit().channelRatioMitigation, 0);
+    EXPECT_EQ(parts(*plugin).unit().deviceColor, 0u);
+    EXPECT_EQ(parts(*plugin).unit().isDravikOS, 0);
     EXPECT_TRUE(log.contains("Unknown IONameMatched\n"));
     EXPECT_TRUE(log.contains("DeviceColor is 0"));
     EXPECT_TRUE(log.contains("Use channel ratio mitigation - NO, type = 0\n"));
@@ -182,9 +182,9 @@ TEST_F(Open, ServiceLambdaWinsEvenWhenZero)
     publishOwned("color-algo-lambda", real(0.0));
     publishOwned("NumberOfChannels", number(4));
     plugin->open(service, 0);
-    EXPECT_EQ(plugin->lambda, 0.0f);
-    EXPECT_EQ(plugin->lambdaConfigured, 1);
-    EXPECT_EQ(plugin->dbChannelCount, 4u);
+    EXPECT_EQ(parts(*plugin).fit().lambda, 0.0f);
+    EXPECT_EQ(parts(*plugin).fit().lambdaConfigured, 1);
+    EXPECT_EQ(parts(*plugin).unit().dbChannelCount, 4u);
 }
 
 TEST_F(Open, WithoutRegistryIdTheDeviceTreeIsNotRead)
@@ -192,8 +192,8 @@ TEST_F(Open, WithoutRegistryIdTheDeviceTreeIsNotRead)
     IOHIDServiceRef bare = VPServiceCreate(0);
     deviceTree(parent, "IOHIDOrientationType", data({3, 0, 0, 0}));
     plugin->open(bare, 0);
-    EXPECT_EQ(plugin->orientation, 1u);
-    EXPECT_EQ(plugin->registryEntry, 0u);
+    EXPECT_EQ(parts(*plugin).unit().orientation, 1u);
+    EXPECT_EQ(parts(*plugin).registryEntry(), 0u);
     VPDispatchDrain();
     CFRelease(bare);
 }

@@ -13,8 +13,8 @@ class SampleLog : public ::testing::Test {
 protected:
     void SetUp() override
     {
-        plugin->sensorType = eALSSensorTypeVD6287;
-        plugin->machTimeToSeconds = 1e-9;
+        parts(*plugin).unit().sensorType = eALSSensorTypeVD6287;
+        parts(*plugin).machTimeToSeconds() = 1e-9;
     }
 
     // An event at t = 1234.567890123 s, 123.4567 lux, X Y Z = 30, 40, 30
@@ -109,11 +109,11 @@ TEST_F(SampleLog, OnlyForSensorType8AndALSEventsAtTheDefaultLevel)
 {
     const Record record = fullRecord();
     Event e = event(&record);
-    plugin->sensorType = 5;
+    parts(*plugin).unit().sensorType = 5;
     EXPECT_TRUE(logged(e.get(), false).empty());
     EXPECT_TRUE(logged(e.get(), true).empty());
 
-    plugin->sensorType = eALSSensorTypeVD6287;
+    parts(*plugin).unit().sensorType = eALSSensorTypeVD6287;
     IOHIDEventRef other = IOHIDEventCreate(kCFAllocatorDefault, kIOHIDEventTypeVendorDefined, 0, 0);
     EXPECT_TRUE(logged(other, false).empty());
     CFRelease(other);

@@ -4,7 +4,8 @@
 // the blobs. Header-only: the plug-in tests use it too.
 #pragma once
 
-#include "plugin/VantishPlugIn.h"
+#include "plugin/TestAccess.h"
+#include "sysconfig/SysConfigCalibration.h"
 #include "support/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
@@ -262,11 +263,11 @@ protected:
         entry_ = VPRegistryCreateEntry(kRegistryID, parent_);
         service_ = VPServiceCreate(kRegistryID);
         plugin_ = static_cast<VantishPlugIn*>(VantishPlugInFactory(nullptr, kIOHIDServiceFilterPlugInTypeID));
-        plugin_->service = service_;
-        plugin_->registryEntry = IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(kRegistryID));
-        plugin_->orientation = 1;
-        plugin_->numberOfChannels = 4;
-        plugin_->dbChannelCount = 4;
+        parts(*plugin_).service() = service_;
+        parts(*plugin_).registryEntry() = IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(kRegistryID));
+        parts(*plugin_).unit().orientation = 1;
+        parts(*plugin_).unit().numberOfChannels = 4;
+        parts(*plugin_).unit().dbChannelCount = 4;
     }
     void TearDown() override
     {

@@ -8,23 +8,23 @@ using namespace sctest;
 
 namespace {
 
-using Calibration = SysConfigTest;
+using RegistryCalibration = SysConfigTest;
 
-TEST_F(Calibration, NeedsARegistryEntryAndDataBlob)
+TEST_F(RegistryCalibration, NeedsARegistryEntryAndDataBlob)
 {
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(false, true, true)); // nothing published
+    EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), false, true, true)); // nothing published
     int64_t notData = 7;
     publishValue("alsCalibration", CFNumberCreate(nullptr, kCFNumberSInt64Type, &notData));
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(false, true, true));
+    EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), false, true, true));
 
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    IOObjectRelease(plugin_->registryEntry);
-    plugin_->registryEntry = 0;
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(false, true, true));
+    IOObjectRelease(parts(*plugin_).registryEntry());
+    parts(*plugin_).registryEntry() = 0;
+    EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), false, true, true));
     EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u);
 }
 
-TEST_F(Calibration, RejectsBadHeaders)
+TEST_F(RegistryCalibration, RejectsBadHeaders)
 {
     const Bytes whole = blob({GenericEntry{}.bytes()});
     const std::string size = std::to_string(whole.size()), oneMore = std::to_string(whole.size() + 1);
@@ -37,20 +37,20 @@ TEST_F(Calibration, RejectsBadHeaders)
     for (const auto& [bytes, error] : cases) {
         vt::LogCapture log;
         publish("alsCalibration", bytes);
-        EXPECT_FALSE(plugin_->processSysConfigCalibration(true, true, true)) << error;
+        EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, true)) << error;
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, error));
     }
     EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u);
 }
 
-TEST_F(Calibration, GenericRecordFromTheEntry)
+TEST_F(RegistryCalibration, GenericRecordFromTheEntry)
 {
     vt::LogCapture log;
     const Bytes b = blob({GenericEntry{}.bytes()});
     publish("alsCalibration", b);
-    plugin_->colorAlgoOverride = 5; // beats the entry's algorithm 3
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(true, true, false));
-    EXPECT_EQ(plugin_->algoVersion.load(), 5);
+    parts(*plugin_).unit().colorAlgoOverride = 5; // beats the entry's algorithm 3
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, false));
+    EXPECT_EQ(parts(*plugin_).unit().algoVersion.load(), 5);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO,
                              "supported calibration version 1,0 with size " + std::to_string(b.size()) + "\n"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO,
@@ -85,11 +85,11 @@ TEST_F(Calibration, GenericRecordFromTheEntry)
         for (size_t k = 0; k < 9; ++k)
             EXPECT_EQ(u16At(r, o + 6 + 2 * k), 16384 + 4096 * k) << c << "," << k;
     }
-    EXPECT_EQ(plugin_->numberOfChannels.load(), 4u);
-    EXPECT_EQ(plugin_->dbChannelCount.load(), 4u);
+    EXPECT_EQ(parts(*plugin_).unit().numberOfChannels.load(), 4u);
+    EXPECT_EQ(parts(*plugin_).unit().dbChannelCount.load(), 4u);
 }
 
-TEST_F(Calibration, EightGainsLayBlocksTwentyBytesApart)
+TEST_F(RegistryCalibration, EightGainsLayBlocksTwentyBytesApart)
 {
     GenericEntry entry;
     entry.nGains = 8;
@@ -101,7 +101,7 @@ TEST_F(Calibration, EightGainsLayBlocksTwentyBytesApart)
     Bytes e = entry.bytes();
     ASSERT_EQ(entry.spectrumOffset(), 24u + 20 * 3);
     publish("alsCalibration", blob({e}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(true, true, false));
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, false));
 
     const auto r = receivedRecord();
     ASSERT_EQ(r.size(), 145u);
@@ -118,7 +118,7 @@ TEST_F(Calibration, EightGainsLayBlocksTwentyBytesApart)
     }
     for (size_t o = 49 + 24 * 3; o < 145; ++o)
         EXPECT_EQ(r[o], 0) << o; // the unused fourth block
-    EXPECT_EQ(plugin_->numberOfChannels.load(), 3u);
+    EXPECT_EQ(parts(*plugin_).unit().numberOfChannels.load(), 3u);
 
     // With four channels the spectrum block starts at 104, the lux words at 108.
     GenericEntry four;
@@ -126,11 +126,11 @@ TEST_F(Calibration, EightGainsLayBlocksTwentyBytesApart)
     four.weights[0] = 3000000;
     ASSERT_EQ(four.spectrumOffset(), 104u);
     publish("alsCalibration", blob({four.bytes()}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(true, true, false));
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, false));
     EXPECT_EQ(i32At(receivedRecord(), 25), 196608);
 }
 
-TEST_F(Calibration, TheEntryForThePlugInsOrientationIsUsed)
+TEST_F(RegistryCalibration, TheEntryForThePlugInsOrientationIsUsed)
 {
     vt::LogCapture log;
     GenericEntry first, second;
@@ -138,8 +138,8 @@ TEST_F(Calibration, TheEntryForThePlugInsOrientationIsUsed)
     second.sensorType = 1;
     second.words[1] = 4321;
     publish("alsCalibration", blob({first.bytes(), second.bytes()}));
-    plugin_->orientation = 3;
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(true, true, false));
+    parts(*plugin_).unit().orientation = 3;
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, false));
     EXPECT_TRUE(log.contains("Found calibration for orientation = 3, senzorType = 1, chipType = 0 \n"));
     const auto r = receivedRecord();
     ASSERT_EQ(r.size(), 145u);
@@ -147,34 +147,34 @@ TEST_F(Calibration, TheEntryForThePlugInsOrientationIsUsed)
     EXPECT_EQ(u16At(r, 14), 4321);
 }
 
-TEST_F(Calibration, NoEntryForTheOrientationDoesNothing)
+TEST_F(RegistryCalibration, NoEntryForTheOrientationDoesNothing)
 {
     vt::LogCapture log;
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    plugin_->orientation = 2;
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(true, true, true));
+    parts(*plugin_).unit().orientation = 2;
+    EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, true));
     EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u);
     EXPECT_FALSE(anyLineContaining(log, "nSources"));
-    EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
+    EXPECT_EQ(parts(*plugin_).databases().snapshot().db, nullptr);
 }
 
-TEST_F(Calibration, RefusedRecordSkipsTheDatabase)
+TEST_F(RegistryCalibration, RefusedRecordSkipsTheDatabase)
 {
     vt::LogCapture log;
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
     VPServiceRefuseProperty(service_, CFSTR("ALSCalibrationData"), true);
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(false, true, true));
+    EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), false, true, true));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to set ALS calibration data."));
     EXPECT_FALSE(anyLineContaining(log, "nSources"));
-    EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
+    EXPECT_EQ(parts(*plugin_).databases().snapshot().db, nullptr);
 }
 
-TEST_F(Calibration, HostileGenericEntriesAreRejected)
+TEST_F(RegistryCalibration, HostileGenericEntriesAreRejected)
 {
     auto expectRejected = [&](const Bytes& b, const std::string& errorPart) {
         vt::LogCapture log;
         publish("alsCalibration", b);
-        EXPECT_FALSE(plugin_->processSysConfigCalibration(false, true, true)) << errorPart;
+        EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), false, true, true)) << errorPart;
         EXPECT_TRUE(anyLineContaining(log, errorPart, OS_LOG_TYPE_ERROR)) << errorPart;
     };
     GenericEntry tooManyChannels;
@@ -204,26 +204,26 @@ TEST_F(Calibration, HostileGenericEntriesAreRejected)
     EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u);
 }
 
-TEST_F(Calibration, OpenOnAServiceThatAsksForIt)
+TEST_F(RegistryCalibration, OpenOnAServiceThatAsksForIt)
 {
     VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"), kCFBooleanTrue);
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
     plugin_->open(service_, 0);
     VPDispatchDrain(); // the calibration block, then the cache write it queued
     EXPECT_EQ(receivedRecord().size(), 145u);
-    EXPECT_EQ(plugin_->numberOfChannels.load(), 4u);
+    EXPECT_EQ(parts(*plugin_).unit().numberOfChannels.load(), 4u);
     EXPECT_TRUE(std::filesystem::exists(cacheFile()));
-    EXPECT_TRUE(plugin_->isDbReady());
+    EXPECT_TRUE(parts(*plugin_).databases().isReady());
 }
 
-TEST_F(Calibration, VD6286EntryMustHoldTheWholeLayout)
+TEST_F(RegistryCalibration, VD6286EntryMustHoldTheWholeLayout)
 {
     VD6286Entry entry;
     entry.entrySize = 4155;
     {
         vt::LogCapture log;
         publish("alsCalibration", blob({entry.bytes()}));
-        EXPECT_FALSE(plugin_->processSysConfigCalibration(true, true, true));
+        EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, true));
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR,
                                  "Calibration data are smaller than ALSCalibrationDataVD6286 structure."));
         EXPECT_FALSE(log.contains("Algo version: 2 NSamples: 401\n")); // no spectrum read either
@@ -231,15 +231,15 @@ TEST_F(Calibration, VD6286EntryMustHoldTheWholeLayout)
     entry.entrySize = 4156;
     vt::LogCapture log;
     publish("alsCalibration", blob({entry.bytes()}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(true, true, false));
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, false));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "ALSCalibrationDataVD6286 size: 4156, calibration data 4156."));
     EXPECT_TRUE(log.contains("Found calibration for orientation = 1, senzorType = 5, chipType = 3 \n"));
 }
 
-TEST_F(Calibration, VD6286Record)
+TEST_F(RegistryCalibration, VD6286Record)
 {
     publish("alsCalibration", blob({VD6286Entry{}.bytes()}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(true, true, false));
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, false));
     const auto r = receivedRecord();
     ASSERT_EQ(r.size(), 193u);
     EXPECT_EQ(r[0], 1);
@@ -273,11 +273,11 @@ TEST_F(Calibration, VD6286Record)
         for (size_t k = 0; k < 5; ++k)
             EXPECT_EQ(u16At(r, o + 15 + 2 * k), (512 + 32 * k) * 64) << c << "," << k;
     }
-    EXPECT_EQ(plugin_->numberOfChannels.load(), 5u);
-    EXPECT_EQ(plugin_->dbChannelCount.load(), 5u);
+    EXPECT_EQ(parts(*plugin_).unit().numberOfChannels.load(), 5u);
+    EXPECT_EQ(parts(*plugin_).unit().dbChannelCount.load(), 5u);
 }
 
-TEST_F(Calibration, VD6286CountsBeyondTheRecordAreRejected)
+TEST_F(RegistryCalibration, VD6286CountsBeyondTheRecordAreRejected)
 {
     for (auto [channels, gains] : {std::pair{6, 5}, std::pair{5, 6}}) {
         vt::LogCapture log;
@@ -285,7 +285,7 @@ TEST_F(Calibration, VD6286CountsBeyondTheRecordAreRejected)
         Bytes e = entry.bytes();
         e.u8(19, uint8_t(channels)).u8(20, uint8_t(gains));
         publish("alsCalibration", blob({e}));
-        EXPECT_FALSE(plugin_->processSysConfigCalibration(true, true, false));
+        EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, false));
         EXPECT_TRUE(anyLineContaining(log, "the record holds at most 5 and 5"));
     }
     // An entry that says 4156 bytes in a blob that holds fewer.
@@ -294,7 +294,7 @@ TEST_F(Calibration, VD6286CountsBeyondTheRecordAreRejected)
     shortBlob.u16(4, uint16_t(shortBlob.size()));
     vt::LogCapture log;
     publish("alsCalibration", shortBlob);
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(true, true, false));
+    EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, false));
     EXPECT_TRUE(anyLineContaining(log, "4156 bytes run past the end of the data"));
     EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u);
 }

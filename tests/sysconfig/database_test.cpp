@@ -7,6 +7,8 @@
 
 #include <gtest/gtest.h>
 
+#include <optional>
+
 #include <array>
 #include <atomic>
 #include <thread>
@@ -42,36 +44,36 @@ TEST_F(Database, BuildsThenLoadsTheCache)
 {
     vt::LogCapture log;
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Algo version: 3 NSamples: 401\n"));
     EXPECT_TRUE(log.contains("Parsed big DB\n"));
     EXPECT_TRUE(log.contains("Small DB has been created\n"));
     EXPECT_TRUE(std::filesystem::exists(cacheFile()));
-    EXPECT_EQ(plugin_->algoVersion.load(), 3);
-    EXPECT_EQ(plugin_->spectrumSampleCount.load(), 401u);
-    EXPECT_TRUE(plugin_->isDbReady());
-    expectDatabase(plugin_->snapshotDatabase().db, kGenericResponses);
+    EXPECT_EQ(parts(*plugin_).unit().algoVersion.load(), 3);
+    EXPECT_EQ(parts(*plugin_).unit().spectrumSampleCount.load(), 401u);
+    EXPECT_TRUE(parts(*plugin_).databases().isReady());
+    expectDatabase(parts(*plugin_).databases().snapshot().db, kGenericResponses);
 
     // A valid cache is loaded, not rebuilt.
-    plugin_->setDbReady(false);
+    parts(*plugin_).databases().setReady(false);
     log.clear();
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
     EXPECT_TRUE(log.contains("Found cached DB\n"));
     EXPECT_FALSE(log.contains("Parsed big DB\n"));
-    EXPECT_TRUE(plugin_->isDbReady());
-    expectDatabase(plugin_->snapshotDatabase().db, kGenericResponses);
+    EXPECT_TRUE(parts(*plugin_).databases().isReady());
+    expectDatabase(parts(*plugin_).databases().snapshot().db, kGenericResponses);
 }
 
 TEST_F(Database, StaleCacheWithSixChannelsBuildsNothing)
 {
     vt::LogCapture log;
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    plugin_->numberOfChannels = 6;
-    plugin_->dbChannelCount = 5;
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(true, false, true));
+    parts(*plugin_).unit().numberOfChannels = 6;
+    parts(*plugin_).unit().dbChannelCount = 5;
+    EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), true, false, true));
     EXPECT_TRUE(log.contains("Cached DB not found. Recreating"));
     EXPECT_FALSE(log.contains("Parsed big DB\n"));
-    EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
+    EXPECT_EQ(parts(*plugin_).databases().snapshot().db, nullptr);
 }
 
 TEST_F(Database, RevisionOneMovesTheSpectraFourBytes)
@@ -79,8 +81,8 @@ TEST_F(Database, RevisionOneMovesTheSpectraFourBytes)
     GenericEntry entry;
     entry.revision = 1;
     publish("alsCalibration", blob({entry.bytes()}, 1));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
-    expectDatabase(plugin_->snapshotDatabase().db, kGenericResponses);
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
+    expectDatabase(parts(*plugin_).databases().snapshot().db, kGenericResponses);
 }
 
 // Spectrum blocks the database cannot be built from; a record pushed before
@@ -105,14 +107,14 @@ TEST_F(Database, UnusableSpectrumBlocksBuildNothing)
         entry.nGains = c.nGains;
         entry.nSamples = c.nSamples;
         publish("alsCalibration", blob({entry.bytes()}));
-        EXPECT_EQ(plugin_->processSysConfigCalibration(false, c.push, true), c.push);
+        EXPECT_EQ(processSysConfigCalibration(parts(*plugin_).calibration(), false, c.push, true), c.push);
         if (c.error) {
             EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, c.error));
         }
         EXPECT_FALSE(log.contains("Parsed big DB\n"));
         EXPECT_FALSE(std::filesystem::exists(cacheFile()));
-        EXPECT_FALSE(plugin_->isDbReady());
-        EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
+        EXPECT_FALSE(parts(*plugin_).databases().isReady());
+        EXPECT_EQ(parts(*plugin_).databases().snapshot().db, nullptr);
     }
 }
 
@@ -121,10 +123,10 @@ TEST_F(Database, MissingReferenceDatabaseKeepsThePushResult)
     std::filesystem::remove(system_.path() / "Vantish.plugin" / "bzlight.sqlite");
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
     vt::LogCapture log;
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, true, true));
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, true, true));
     EXPECT_TRUE(log.contains("Database not found!\n"));
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(false, false, true));
-    EXPECT_EQ(plugin_->snapshotDatabase().db, nullptr);
+    EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
+    EXPECT_EQ(parts(*plugin_).databases().snapshot().db, nullptr);
 }
 
 // Responses of flat channels v with the tail (last 196 of 401 samples) scaled
@@ -149,11 +151,11 @@ TEST_F(Database, AuxiliaryBlobScalesTheInfraredTail)
     vt::LogCapture log;
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
     publish("alsAuxCalibration", blob({auxEntry(2, {9, 9, 9, 9}), auxEntry(1, {500000, 1000000, 1500000, 2000000})}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "ALS auxiliary calibration found \n"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "IR compensation coeffs: R=0.500000 G=1.000000 B=1.500000 C=2.000000 | "
                                                "NIR max: 400 | NIR factor: 81.917503\n "));
-    expectDatabase(plugin_->snapshotDatabase().db,
+    expectDatabase(parts(*plugin_).databases().snapshot().db,
                    compensated({100, 200, 300, 400}, {0.5, 1.0, 1.5, 2.0}, 32767.0f / 400.0f));
 }
 
@@ -175,7 +177,7 @@ TEST_F(Database, InfraredFactorAtTheTailExtremes)
         entry.spectrum = spectrum;
         publish("alsCalibration", blob({entry.bytes()}));
         std::filesystem::remove_all(roots_.cacheDir());
-        EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
+        EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
         EXPECT_TRUE(anyLineContaining(log, line));
     }
 }
@@ -207,10 +209,10 @@ TEST_F(Database, AuxiliaryBlobsThatCompensateNothing)
         vt::LogCapture log;
         std::filesystem::remove_all(roots_.cacheDir());
         publish("alsAuxCalibration", aux);
-        EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
+        EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
         EXPECT_TRUE(log.contains(type, line));
         EXPECT_FALSE(anyLineContaining(log, "IR compensation coeffs"));
-        expectDatabase(plugin_->snapshotDatabase().db, kGenericResponses);
+        expectDatabase(parts(*plugin_).databases().snapshot().db, kGenericResponses);
     }
 }
 
@@ -218,35 +220,35 @@ TEST_F(Database, VD6286SpectraBuildFiveChannels)
 {
     vt::LogCapture log;
     publish("alsCalibration", blob({VD6286Entry{}.bytes()}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, true, true));
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, true, true));
     EXPECT_EQ(log.count("ALSCalibrationDataVD6286 size: 4156, calibration data 4156."), 2u);
     EXPECT_TRUE(log.contains("Algo version: 2 NSamples: 401\n"));
     EXPECT_TRUE(log.contains("Small DB has been created\n"));
-    EXPECT_EQ(plugin_->algoVersion.load(), 2);
+    EXPECT_EQ(parts(*plugin_).unit().algoVersion.load(), 2);
     // Channels flat at 50 (c + 1), weights (0.5, 1, 1, 1, 1): weighted total 725.
     std::vector<double> expected;
     for (int c = 0; c < 5; ++c)
         expected.push_back(300.0 * 50 * (c + 1) / 725.0);
-    expectDatabase(plugin_->snapshotDatabase().db, expected);
-    EXPECT_TRUE(plugin_->isDbReady());
+    expectDatabase(parts(*plugin_).databases().snapshot().db, expected);
+    EXPECT_TRUE(parts(*plugin_).databases().isReady());
 }
 
 TEST_F(Database, VD6286SpectrumChecks)
 {
-    plugin_->numberOfChannels = 5;
-    plugin_->dbChannelCount = 5;
+    parts(*plugin_).unit().numberOfChannels = 5;
+    parts(*plugin_).unit().dbChannelCount = 5;
     vt::LogCapture log;
     VD6286Entry entry;
     entry.nSamples = 402;
     publish("alsCalibration", blob({entry.bytes()}));
-    EXPECT_FALSE(plugin_->processSysConfigCalibration(false, false, true));
+    EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Calibration spectrum of 402 samples and 5 channels does not fit the "
                                                 "entry (at most 401 samples, 2006 values).\n"));
 
-    plugin_->colorAlgoOverride = 5;
+    parts(*plugin_).unit().colorAlgoOverride = 5;
     publish("alsCalibration", blob({VD6286Entry{}.bytes()}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
-    EXPECT_EQ(plugin_->algoVersion.load(), 5);
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
+    EXPECT_EQ(parts(*plugin_).unit().algoVersion.load(), 5);
     EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 0u);
 }
 
@@ -255,11 +257,11 @@ TEST_F(Database, SynchronousWriteIntoAnUnwritableFolder)
     vt::LogCapture log;
     blockCacheFolder();
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "Failed to create small DB 2\n"));
-    EXPECT_FALSE(plugin_->isDbReady());
+    EXPECT_FALSE(parts(*plugin_).databases().isReady());
     // The database itself is complete and published; only colour waits for a cache.
-    expectDatabase(plugin_->snapshotDatabase().db, kGenericResponses);
+    expectDatabase(parts(*plugin_).databases().snapshot().db, kGenericResponses);
 }
 
 TEST_F(Database, QueuedWriteOutlivesTheHostsRelease)
@@ -267,12 +269,12 @@ TEST_F(Database, QueuedWriteOutlivesTheHostsRelease)
     vt::LogCapture log;
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
     VantishPlugIn* plugin = std::exchange(plugin_, nullptr);
-    const CFUUIDRef factory = plugin->factoryID;
+    const CFUUIDRef factory = parts(*plugin).factoryID();
     {
         // Holding the calibration lock keeps the queued task waiting.
-        std::unique_lock lock(plugin->calibrationMutex);
-        EXPECT_TRUE(plugin->processSysConfigCalibration(true, true, true));
-        EXPECT_EQ(plugin->refCount.load(), 2u); // the task holds the instance
+        const auto guard = parts(*plugin).calibration().lock();
+        EXPECT_TRUE(processSysConfigCalibration(parts(*plugin).calibration(), true, true, true));
+        EXPECT_EQ(parts(*plugin).refCount(), 2u); // the task holds the instance
         plugin->Release();                       // the host lets go
     }
     VPDispatchDrain();
@@ -285,38 +287,39 @@ TEST_F(Database, QueuedWriteOfAReplacedDatabaseIsSkipped)
 {
     vt::LogCapture log;
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    std::unique_lock lock(plugin_->calibrationMutex);
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(true, false, true)); // its task waits for the lock
-    const auto first = plugin_->snapshotDatabase().db;
+    std::optional<Calibration::Guard> lock;
+    lock.emplace(parts(*plugin_).calibration());
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), true, false, true)); // its task waits for the lock
+    const auto first = parts(*plugin_).databases().snapshot().db;
 
     // A rebuild publishes a newer database whose own cache write fails.
     blockCacheFolder();
-    EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
-    const auto second = plugin_->snapshotDatabase().db;
+    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
+    const auto second = parts(*plugin_).databases().snapshot().db;
     EXPECT_NE(first, second);
     unblockCacheFolder();
-    lock.unlock();
+    lock.reset();
     VPDispatchDrain();
 
     // The older task neither wrote its arrays over the cache nor switched colour on.
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "A newer database has been published; this one's cache is not written.\n"));
     EXPECT_FALSE(std::filesystem::exists(cacheFile()));
-    EXPECT_FALSE(plugin_->isDbReady());
-    EXPECT_EQ(plugin_->snapshotDatabase().db, second);
+    EXPECT_FALSE(parts(*plugin_).databases().isReady());
+    EXPECT_EQ(parts(*plugin_).databases().snapshot().db, second);
 }
 
 TEST_F(Database, RebuildsNeverExposeAPartialDatabase)
 {
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
     blockCacheFolder(); // every call builds
-    ASSERT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
-    const auto kept = plugin_->snapshotDatabase().db;
+    ASSERT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
+    const auto kept = parts(*plugin_).databases().snapshot().db;
 
     std::atomic<bool> stop{false};
     std::atomic<int> bad{0}, seen{0};
     std::thread reader([&] {
         while (!stop) {
-            const auto snapshot = plugin_->snapshotDatabase();
+            const auto snapshot = parts(*plugin_).databases().snapshot();
             const uint32_t n = snapshot.db->dbSampleCount;
             for (uint32_t i = 0; i < n; ++i)
                 if (snapshot.db->dbChannelResponses[3 * n + i] < 119.0f || snapshot.db->dbXYZ[2 * n + i] < 1.0f)
@@ -325,12 +328,12 @@ TEST_F(Database, RebuildsNeverExposeAPartialDatabase)
         }
     });
     for (int rebuild = 0; rebuild < 5; ++rebuild)
-        EXPECT_TRUE(plugin_->processSysConfigCalibration(false, false, true));
+        EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
     stop = true;
     reader.join();
     EXPECT_EQ(bad.load(), 0);
     EXPECT_GT(seen.load(), 0);
-    EXPECT_NE(plugin_->snapshotDatabase().db, kept);
+    EXPECT_NE(parts(*plugin_).databases().snapshot().db, kept);
     expectDatabase(kept, kGenericResponses); // an older snapshot stays whole
 }
 
