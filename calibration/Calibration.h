@@ -19,6 +19,7 @@
 #include "formats/ALSSensorType.h"
 #include "lightdb/DatabaseSlot.h"
 #include "lightdb/Matrices.h"
+#include "support/CFOwned.h"
 
 #include <CoreFoundation/CoreFoundation.h>
 #include <IOKit/IOKitLib.h>
@@ -60,13 +61,17 @@ public:
     bool calibrateSensorWithDefaultCalibration(eALSSensorType type);
     bool loadQVTCalibration(bool forceRebuild);
     CFDataRef copyQVTCalibrationData(CFStringRef key);
-    bool processQVTCalibrationXwCAT2(CFDataRef& data, CFDataRef& record);
-    bool processQVTCalibrationVD6287_XwClv3(CFDataRef& data, CFDataRef& record);
+    // The driver record parsed from a factory record of that layout (and the
+    // unit's channel counts and cache version set from it), or null.
+    CFOwned<CFDataRef> processQVTCalibrationXwCAT2(CFDataRef data);
+    CFOwned<CFDataRef> processQVTCalibrationVD6287_XwClv3(CFDataRef data);
     // A new 10348-byte version-3 record from a 10440-byte version-1 record, or
     // null when the input is not one or cannot be converted safely.
     CFDataRef convertSorvelXwClv1Tov3(CFDataRef versionOne);
-    bool processQVTSpectrumXwCAT2(CFDataRef& data, Matrices& matrices);
-    bool processQVTSpectrumVD6287_XwClv3(CFDataRef& data, Matrices& matrices);
+    // The channel spectra and weights of a factory record into `matrices`
+    // (whose nChannels and firstChannel the caller has set).
+    bool processQVTSpectrumXwCAT2(CFDataRef data, Matrices& matrices);
+    bool processQVTSpectrumVD6287_XwClv3(CFDataRef data, Matrices& matrices);
 
     // ---- What the calibration paths share -----------------------------------------
     // The lock that keeps calibration on this instance to one piece at a time,

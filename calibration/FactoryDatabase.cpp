@@ -10,6 +10,7 @@
 #include "lightdb/CachedDB.h"
 #include "lightdb/LDBM.h"
 #include "calibration/Calibration.h"
+#include "support/Assert.h"
 #include "support/Log.h"
 
 #include <memory>
@@ -138,6 +139,7 @@ FactoryLayout factoryLayoutOf(size_t length)
 
 void finishFactoryDatabase(Calibration& p, const FactorySource& source, bool forceRebuild)
 {
+    VANTISH_ASSERT(p.lockHeldByCaller());
     SpectralDatabase db;
     const bool usable = colourChannelsUsable(p.unit().numberOfChannels.load());
     const CacheKey key{int(p.unit().orientation.load()), p.unit().smallDBVersion.load(), p.unit().chipId.load()};

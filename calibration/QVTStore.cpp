@@ -38,16 +38,12 @@ ParsedRecord parseFactoryData(Calibration& p, CFDataRef data)
     ParsedRecord parsed;
     parsed.source.data = data;
     parsed.source.layout = calib::factoryLayoutOf(size_t(CFDataGetLength(data)));
-    CFDataRef input = data;
-    CFDataRef record = nullptr;
     switch (parsed.source.layout) {
     case calib::FactoryLayout::VD6287:
-        if (p.processQVTCalibrationVD6287_XwClv3(input, record))
-            parsed.record.reset(record);
+        parsed.record = p.processQVTCalibrationVD6287_XwClv3(data);
         break;
     case calib::FactoryLayout::XwCAT2:
-        if (p.processQVTCalibrationXwCAT2(input, record))
-            parsed.record.reset(record);
+        parsed.record = p.processQVTCalibrationXwCAT2(data);
         break;
     case calib::FactoryLayout::XwCl: {
         calib::XwClParse xwcl = calib::parseXwClRecord(p, {CFDataGetBytePtr(data), size_t(CFDataGetLength(data))});

@@ -108,7 +108,7 @@ bool extractXwClSpectrum(Calibration& p, std::span<const uint8_t> data, size_t e
 
 } // namespace calib
 
-bool Calibration::processQVTSpectrumXwCAT2(CFDataRef& data, Matrices& matrices)
+bool Calibration::processQVTSpectrumXwCAT2(CFDataRef data, Matrices& matrices)
 {
     using namespace stored::xwca;
     VLOG_DEFAULT("Process QVT calibration spectrum");
@@ -129,7 +129,7 @@ bool Calibration::processQVTSpectrumXwCAT2(CFDataRef& data, Matrices& matrices)
     return calib::fill(*this, matrices, sp, false, false);
 }
 
-bool Calibration::processQVTSpectrumVD6287_XwClv3(CFDataRef& data, Matrices& matrices)
+bool Calibration::processQVTSpectrumVD6287_XwClv3(CFDataRef data, Matrices& matrices)
 {
     using namespace stored::vd6287;
     VLOG_DEFAULT("Process QVT calibration spectrum");

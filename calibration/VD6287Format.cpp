@@ -160,32 +160,32 @@ CFDataRef Calibration::convertSorvelXwClv1Tov3(CFDataRef versionOne)
     return out.createData();
 }
 
-bool Calibration::processQVTCalibrationVD6287_XwClv3(CFDataRef& data, CFDataRef& record)
+CFOwned<CFDataRef> Calibration::processQVTCalibrationVD6287_XwClv3(CFDataRef data)
 {
     const CFIndex length = data ? CFDataGetLength(data) : 0;
     if (length != CFIndex(kV3Size)) {
         VLOG_ERROR("QVT calibration size - %ld != %lu\n", long(length), static_cast<unsigned long>(kV3Size));
-        return false;
+        return {};
     }
     const std::span<const uint8_t> bytes(CFDataGetBytePtr(data), kV3Size);
     const unsigned blobs = le::get<uint8_t>(bytes, header::numBlobs);
     if (blobs != kBlobs) {
         VLOG_ERROR("Calibration num_blobs=%u, expected=2\n", blobs);
-        return false;
+        return {};
     }
     if (!blobsAre(bytes, blob::type, 0, 1)) {
         VLOG_ERROR("Unexpected calibration blob types!\n");
-        return false;
+        return {};
     }
     if (!blobsAre(bytes, blob::numChannels, kChannels, kChannels) || !blobsAre(bytes, blob::numGains, kGains, kGains)) {
         VLOG_ERROR("Unexpected num_channels/num_gains!\n");
-        return false;
+        return {};
     }
     for (unsigned k = 0; k < kBlobs; ++k) {
         const unsigned entries = le::get<uint8_t>(bytes, v3BlobOffset(k) + blob::entryCount);
         if (entries > kMaxEntries) {
             VLOG_ERROR("Calibration blob %u holds %u table entries, expected at most %u\n", k, entries, kMaxEntries);
-            return false;
+            return {};
         }
     }
     VLOG_DEFAULT("XwCl calibration version = v%d.%d\n", int(le::get<uint8_t>(bytes, header::versionMajor)),
@@ -196,12 +196,11 @@ bool Calibration::processQVTCalibrationVD6287_XwClv3(CFDataRef& data, CFDataRef&
         putHalf(out, half::kHalfSize * k, bytes.subspan(v3BlobOffset(k), kV3BlobSize));
     CFOwned<CFDataRef> built(out.createData());
     if (!built)
-        return false;
+        return {};
 
     unit_.numberOfChannels = kChannels;
     unit_.dbChannelCount = kChannels;
     unit_.smallDBVersion = 1.3f;
-    record = built.release();
     unit_.sensorType = eALSSensorTypeVD6287;
-    return true;
+    return built;
 }

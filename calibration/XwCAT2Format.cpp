@@ -104,13 +104,13 @@ CFDataRef buildRecord(std::span<const uint8_t> data, const Timing& timing, uint8
 
 } // namespace
 
-bool Calibration::processQVTCalibrationXwCAT2(CFDataRef& data, CFDataRef& record)
+CFOwned<CFDataRef> Calibration::processQVTCalibrationXwCAT2(CFDataRef data)
 {
     const CFIndex length = data ? CFDataGetLength(data) : 0;
     VLOG_DEFAULT("QVT calibration data length = %ld\n", long(length));
     if (length != CFIndex(kSize)) {
         VLOG_ERROR("QVT calibration data doesn't match with size of XwCA structure (length = %ld)\n", long(length));
-        return false;
+        return {};
     }
     const std::span<const uint8_t> bytes(CFDataGetBytePtr(data), size_t(length));
     const uint8_t major = le::get<uint8_t>(bytes, versionMajor);
@@ -124,7 +124,7 @@ bool Calibration::processQVTCalibrationXwCAT2(CFDataRef& data, CFDataRef& record
         VLOG_ERROR("Chip ID doesn't match - (device chip ID 0x%08X != calibration chip ID 0x%08X and chip_id_reversed "
                    "0x%08X)",
                    unit_.chipId.load(), storedId, calib::reversedChipId(storedId));
-        return false;
+        return {};
     }
 
     const uint8_t nChannels = le::get<uint8_t>(bytes, stored::xwca::nChannels);
@@ -133,16 +133,15 @@ bool Calibration::processQVTCalibrationXwCAT2(CFDataRef& data, CFDataRef& record
         VLOG_ERROR("XwCA calibration with %u channels and %u gains does not fit the %u-channel record -> "
                    "calibration will be skipped.\n",
                    unsigned(nChannels), unsigned(nGains), kMaxChannels);
-        return false;
+        return {};
     }
 
     const Timing timing = timingFor(bytes, int(major) * 10 + int(minor), nGains);
     CFOwned<CFDataRef> built(buildRecord(bytes, timing, nChannels, nGains));
     if (!built)
-        return false;
+        return {};
     unit_.smallDBVersion = 1.3f;
     unit_.numberOfChannels = nChannels;
     unit_.dbChannelCount = nChannels;
-    record = built.release();
-    return true;
+    return built;
 }

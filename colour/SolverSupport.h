@@ -2,6 +2,7 @@
 #pragma once
 
 #include "colour/Solvers.h"
+#include "support/Assert.h"
 
 #include <cmath>
 #include <cstddef>
@@ -14,7 +15,11 @@ namespace solver {
 // Floats of an M x M symmetric matrix in packed storage.
 constexpr int packedSize(int M) { return M * (M + 1) / 2; }
 // Packed position of (a, b), a <= b.
-constexpr int packedIndex(int M, int a, int b) { return a * M - a * (a - 1) / 2 + (b - a); }
+constexpr int packedIndex(int M, int a, int b)
+{
+    VANTISH_ASSERT(0 <= a && a <= b && b < M);
+    return a * M - a * (a - 1) / 2 + (b - a);
+}
 
 // Scratch for one packed matrix of up to kSolverMaxChannels channels.
 using PackedScratch = float[packedSize(kSolverMaxChannels)];

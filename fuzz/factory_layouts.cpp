@@ -51,14 +51,12 @@ void checkExtracted(VantishPlugIn& p, const Matrices& m, bool extracted)
 
 void parseXwCAT2(VantishPlugIn& p, CFDataRef data)
 {
-    CFDataRef input = data;
-    CFDataRef record = nullptr;
-    if (!parts(p).calibration().processQVTCalibrationXwCAT2(input, record))
+    CFOwned<CFDataRef> record = parts(p).calibration().processQVTCalibrationXwCAT2(data);
+    if (!record)
         return;
-    CFOwned<CFDataRef> owned(record);
     Matrices m;
     prepareColumns(p, m);
-    checkExtracted(p, m, parts(p).calibration().processQVTSpectrumXwCAT2(input, m));
+    checkExtracted(p, m, parts(p).calibration().processQVTSpectrumXwCAT2(data, m));
 }
 
 void parseXwCl(VantishPlugIn& p, CFDataRef data)
@@ -76,14 +74,12 @@ void parseXwCl(VantishPlugIn& p, CFDataRef data)
 
 void parseVD6287v3(VantishPlugIn& p, CFDataRef data)
 {
-    CFDataRef input = data;
-    CFDataRef record = nullptr;
-    if (!parts(p).calibration().processQVTCalibrationVD6287_XwClv3(input, record))
+    CFOwned<CFDataRef> record = parts(p).calibration().processQVTCalibrationVD6287_XwClv3(data);
+    if (!record)
         return;
-    CFOwned<CFDataRef> owned(record);
     Matrices m;
     prepareColumns(p, m);
-    checkExtracted(p, m, parts(p).calibration().processQVTSpectrumVD6287_XwClv3(input, m));
+    checkExtracted(p, m, parts(p).calibration().processQVTSpectrumVD6287_XwClv3(data, m));
 }
 
 void parseVD6287v1(VantishPlugIn& p, CFDataRef data)

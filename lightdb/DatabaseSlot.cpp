@@ -1,7 +1,11 @@
 #include "lightdb/DatabaseSlot.h"
 
+#include "support/Assert.h"
+
 void DatabaseSlot::publish(SpectralDatabasePtr db, bool ready)
 {
+    // Calibration publishes only databases it has built whole.
+    VANTISH_ASSERT(!db || db->consistent());
     SpectralDatabasePtr previous;
     {
         std::lock_guard lock(mutex_);

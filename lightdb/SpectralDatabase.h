@@ -22,6 +22,13 @@ struct SpectralDatabase {
     std::vector<float> channelStdDev;      // M per-channel deviations, or empty when not normalised
     LDBMInfo dbInfo;                       // Info row of the reference or cached database
 
+    // The arrays hold exactly what the counts promise.
+    bool consistent() const
+    {
+        const size_t n = dbSampleCount, m = dbChannelCount;
+        return dbXYZ.size() == 3 * n && dbChannelResponses.size() == m * n &&
+               (channelStdDev.empty() || channelStdDev.size() == m);
+    }
     const float* stdDevOrNull() const { return channelStdDev.empty() ? nullptr : channelStdDev.data(); }
     // Sizes the arrays for n sources and m channels, zero-filled.
     void allocate(uint32_t n, uint32_t m)

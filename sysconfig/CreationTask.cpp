@@ -11,6 +11,7 @@
 // recursive, so the in-place task of a synchronous build runs under the lock
 // its caller already holds.
 #include "lightdb/LDBM.h"
+#include "support/Assert.h"
 #include "support/Log.h"
 #include "calibration/Calibration.h"
 #include "sysconfig/DatabaseBuild.h"
@@ -50,6 +51,7 @@ void writeCache(Calibration& calibration, const SpectralDatabasePtr& db, const C
 
 void startCreationTask(Calibration& calibration, bool asyncCreate, SpectralDatabasePtr db)
 {
+    VANTISH_ASSERT(calibration.lockHeldByCaller());
     const CacheKeys keys{int(calibration.unit().orientation.load()), int(calibration.unit().algoVersion.load()),
                          int(calibration.unit().numberOfChannels.load()), calibration.unit().chipId.load()};
     if (!asyncCreate) {

@@ -1,6 +1,7 @@
 // The common end of a configuration-supplied build, and the Matrices record
 // that carries a calibration entry's spectra into the reference scan.
 #include "lightdb/LDBM.h"
+#include "support/Assert.h"
 #include "support/Log.h"
 #include "calibration/Calibration.h"
 #include "sysconfig/DatabaseBuild.h"
@@ -10,6 +11,7 @@ namespace sysconfig {
 bool finishDatabaseBuild(Calibration& calibration, bool asyncCreate, Matrices& matrices,
                          const std::shared_ptr<SpectralDatabase>& db)
 {
+    VANTISH_ASSERT(calibration.lockHeldByCaller());
     const int code = LDBMParseBigDB(&db->dbInfo, ProgressCallback, &matrices, BigDBTypeDefault);
     if (code != 0) {
         VLOG_ERROR("Failed to parse big DB %d\n", code);
@@ -18,7 +20,7 @@ bool finishDatabaseBuild(Calibration& calibration, bool asyncCreate, Matrices& m
     VLOG_DEFAULT("Parsed big DB\n");
     // The arrays are complete. Colour stays as it was (on with the old database,
     // it goes on with this one) until the cache write decides. The caller holds
-    // calibration lock, so no creation task changes dbReady between the read and
+    // the calibration lock, so no creation task changes dbReady between the read and
     // the publication.
     SpectralDatabasePtr complete = db;
     calibration.databases().publish(complete, calibration.databases().isReady());

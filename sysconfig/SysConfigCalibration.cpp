@@ -48,21 +48,15 @@ CFDataRef createGenericRecord(Calibration& calibration, const CalibrationEntry& 
     return data;
 }
 
-PushOutcome pushCalibrationRecord(Calibration& calibration, CFDataRef blob, ALSCalibrationHeader header,
-                                  CalibrationEntry entry)
+PushOutcome pushCalibrationRecord(Calibration& calibration, CFDataRef blob, const ALSCalibrationHeader& header,
+                                  const CalibrationEntry& entry)
 {
-    CFDataRef created = nullptr;
-    if (entry.subHeader.chipType == kChipTypeVD6286) {
-        long recordSize = 0;
-        if (!processSysConfigSensorCalibrationVD6286(calibration, blob, entry.offset, header, entry.subHeader, recordSize,
-                                                            created))
-            return PushOutcome::Failed;
-    } else {
-        created = createGenericRecord(calibration, entry, header);
-        if (!created)
-            return PushOutcome::Failed;
-    }
-    CFOwned<CFDataRef> record(created);
+    CFOwned<CFDataRef> record = entry.subHeader.chipType == kChipTypeVD6286
+                                    ? processSysConfigSensorCalibrationVD6286(calibration, blob, entry.offset, header,
+                                                                              entry.subHeader)
+                                    : CFOwned<CFDataRef>(createGenericRecord(calibration, entry, header));
+    if (!record)
+        return PushOutcome::Failed;
     if (!calibration.host().service())
         return PushOutcome::NoService;
     if (!IOHIDServiceSetProperty(calibration.host().service(), CFSTR("ALSCalibrationData"), record.get())) {

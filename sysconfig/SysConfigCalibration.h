@@ -20,13 +20,14 @@
 // cache written by a queued task when `asyncCreate`).
 bool processSysConfigCalibration(Calibration& calibration, bool asyncCreate, bool pushCalibration,
                                  bool processDatabase);
-// The 193-byte driver record of the VD6286 entry at `entryOffset` of `blob`.
-bool processSysConfigSensorCalibrationVD6286(Calibration& calibration, CFDataRef& blob, long& entryOffset,
-                                             ALSCalibrationHeader& header, ALSCalibrationSubHeader& subHeader,
-                                             long& recordSize, CFDataRef& record);
+// The 193-byte driver record of the VD6286 entry at `entryOffset` of `blob`
+// (and the unit's channel counts set from it), or null.
+CFOwned<CFDataRef> processSysConfigSensorCalibrationVD6286(Calibration& calibration, CFDataRef blob, long entryOffset,
+                                                           const ALSCalibrationHeader& header,
+                                                           const ALSCalibrationSubHeader& subHeader);
 // The VD6286 entry's channel spectra into `matrices`, then the reference scan
 // into `build` (the private database `matrices` points into), published once
 // complete.
-bool processSysConfigSpectrumVD6286(Calibration& calibration, bool asyncCreate, CFDataRef& blob, long& entryOffset,
-                                    ALSCalibrationSubHeader& subHeader, Matrices& matrices,
+bool processSysConfigSpectrumVD6286(Calibration& calibration, bool asyncCreate, CFDataRef blob, long entryOffset,
+                                    const ALSCalibrationSubHeader& subHeader, Matrices& matrices,
                                     const std::shared_ptr<SpectralDatabase>& build);

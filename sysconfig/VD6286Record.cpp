@@ -48,29 +48,26 @@ CFDataRef createRecord(std::span<const uint8_t> entry, uint8_t entryCount, unsig
 
 } // namespace
 
-bool processSysConfigSensorCalibrationVD6286(Calibration& calibration, CFDataRef& blob, long& entryOffset,
-                                                            ALSCalibrationHeader& header,
-                                                            ALSCalibrationSubHeader& subHeader, long& recordSize,
-                                                            CFDataRef& record)
+CFOwned<CFDataRef> processSysConfigSensorCalibrationVD6286(Calibration& calibration, CFDataRef blob, long entryOffset,
+                                                           const ALSCalibrationHeader& header,
+                                                           const ALSCalibrationSubHeader& subHeader)
 {
     const auto located = vd6286::entryAt(blob, entryOffset, subHeader.entrySize);
     if (!located)
-        return false;
+        return {};
     const auto entry = *located;
     const unsigned nChannels = le::get<uint8_t>(entry, generic::kChannelCount);
     const unsigned nGains = le::get<uint8_t>(entry, generic::kGainCount);
     if (nChannels > vd6286::kMaxChannels || nGains > vd6286::kMaxGains) {
         VLOG_ERROR("Calibration entry declares %u channels and %u gains; the record holds at most %u and %u.\n",
                    nChannels, nGains, vd6286::kMaxChannels, vd6286::kMaxGains);
-        return false;
+        return {};
     }
 
-    CFDataRef created = createRecord(entry, header.entryCount, nChannels, nGains);
-    if (!created)
-        return false;
+    CFOwned<CFDataRef> record(createRecord(entry, header.entryCount, nChannels, nGains));
+    if (!record)
+        return {};
     calibration.unit().numberOfChannels = nChannels;
     calibration.unit().dbChannelCount = nChannels;
-    recordSize = long(driver::kFiveChannelRecord.size);
-    record = created;
-    return true;
+    return record;
 }

@@ -11,12 +11,11 @@ protected:
     std::vector<uint8_t> parse(const Bytes& bytes, bool* ok = nullptr)
     {
         CFDataRef data = bytes.data();
-        CFDataRef record = nullptr;
-        const bool parsed = parts(*plugin).calibration().processQVTCalibrationVD6287_XwClv3(data, record);
+        CFOwned<CFDataRef> record = parts(*plugin).calibration().processQVTCalibrationVD6287_XwClv3(data);
         if (ok)
-            *ok = parsed;
+            *ok = bool(record);
         CFRelease(data);
-        return ct::takeBytes(record);
+        return ct::takeBytes(record.release());
     }
 
     std::vector<uint8_t> convert(const Bytes& v1)

@@ -106,9 +106,7 @@ TEST_F(XwCAT2FormatTest, WrongLengthLeavesTheRecordUntouched)
 {
     Bytes shortRecord(9961);
     CFDataRef data = shortRecord.data();
-    CFDataRef record = nullptr;
-    EXPECT_FALSE(parts(*plugin).calibration().processQVTCalibrationXwCAT2(data, record));
-    EXPECT_EQ(record, nullptr);
+    EXPECT_FALSE(parts(*plugin).calibration().processQVTCalibrationXwCAT2(data));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR,
                              "QVT calibration data doesn't match with size of XwCA structure (length = 9961)\n"));
     CFRelease(data);
