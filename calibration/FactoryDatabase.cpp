@@ -71,17 +71,18 @@ bool buildFromSpectra(Calibration& p, const FactorySource& source, SpectralDatab
         return false;
     // A reference file that cannot be read to its end builds nothing; say so,
     // as the configuration-supplied path does.
-    if (const int code = LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, source.bigDBType); code != 0) {
-        VLOG_ERROR("Failed to parse big DB %d\n", code);
+    if (const LDBMResult code = LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, source.bigDBType);
+        code != LDBMResult::Ok) {
+        VLOG_ERROR("Failed to parse big DB %d\n", LDBMCode(code));
         return false;
     }
     VLOG_DEFAULT("Parsed big DB\n");
 
-    const int code = LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(),
-                                       int(p.unit().orientation.load()), int(p.unit().algoVersion.load()), int(rows),
-                                       p.unit().chipId.load(), p.unit().smallDBVersion.load());
-    if (code != 0)
-        VLOG_ERROR("Failed to create small DB %d\n", code);
+    const LDBMResult code = LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(),
+                                              int(p.unit().orientation.load()), int(p.unit().algoVersion.load()),
+                                              int(rows), p.unit().chipId.load(), p.unit().smallDBVersion.load());
+    if (code != LDBMResult::Ok)
+        VLOG_ERROR("Failed to create small DB %d\n", LDBMCode(code));
     else
         VLOG_DEFAULT("Small DB has been created\n");
     return true;

@@ -198,10 +198,10 @@ void run(const Options& o)
     if (db.dbSampleCount == 0 || db.dbChannelCount != uint32_t(o.channels))
         return;
     Matrices m = spectraFor(db, o.channels);
-    if (LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, o.type) != 0)
+    if (LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, o.type) != LDBMResult::Ok)
         return;
     if (LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(), o.orientation, 3, o.channels,
-                          o.chipId, o.smallVersion) != 0)
+                          o.chipId, o.smallVersion) != LDBMResult::Ok)
         return;
     SpectralDatabase cached;
     processCachedDB(key, o.channels, o.type, cached);

@@ -80,12 +80,12 @@ int onSpectraRow(void* context, int columns, char** values, char** names)
 
 } // namespace
 
-int LDBMParseBigDB(const LDBMInfo* info, LDBMSpectrumConsumer consumer, void* userData, BigDBType type)
+LDBMResult LDBMParseBigDB(const LDBMInfo* info, LDBMSpectrumConsumer consumer, void* userData, BigDBType type)
 {
     SqliteConnection db;
     int rc = db.open(VPMapPath(LDBMBigDBPath(type)), SQLITE_OPEN_READONLY);
     if (rc != SQLITE_OK)
-        return rc;
+        return LDBMResult(rc);
 
     SpectraScan scan{consumer, userData, info->sources, {}, {}, {}};
     scan.seen.assign(size_t(std::max(info->sources, 0)), 0);
@@ -94,5 +94,5 @@ int LDBMParseBigDB(const LDBMInfo* info, LDBMSpectrumConsumer consumer, void* us
     // Every ID 0 .. N-1 must have been consumed exactly once (duplicates and
     // strangers already stopped the scan).
     const bool complete = std::all_of(scan.seen.begin(), scan.seen.end(), [](char s) { return s != 0; });
-    return complete ? rc : -1;
+    return complete ? LDBMResult(rc) : LDBMResult::BadSourceIDs;
 }

@@ -11,7 +11,7 @@ bool processCachedDB(const CacheKey& key, int channelCount, BigDBType type, Spec
 {
     const int cacheOrientation = key.orientation;
     bool valid = false;
-    if (LDBMInitialize(cacheOrientation, &db.dbInfo, &valid, type, key.smallDBVersion) != 0) {
+    if (LDBMInitialize(cacheOrientation, &db.dbInfo, &valid, type, key.smallDBVersion) != LDBMResult::Ok) {
         VLOG_DEFAULT("Database not found!\n");
         return false;
     }
@@ -37,7 +37,7 @@ bool processCachedDB(const CacheKey& key, int channelCount, BigDBType type, Spec
         return false;
     }
     if (LDBMParseSmallDB(cacheOrientation, &db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(), int(rows)) !=
-        0) {
+        LDBMResult::Ok) {
         VLOG_DEFAULT("Cached DB corrupted. Recreating");
         return rebuild();
     }

@@ -1,14 +1,26 @@
 // The light database module: the shipped reference spectra, the per-chip
 // database computed from them, and its cache file.
 //
-// Functions return SQLite result codes (0 = success) and a few of their own
-// (documented per function).
+// The functions below report an LDBMResult: success, one of the module's own
+// failures, or the SQLite result code of the step that failed, carried with
+// its number (so a log line of the code reads as the SQLite code).
 #pragma once
 
 #include "lightdb/LDBMInfo.h"
 #include "lightdb/Matrices.h"
 
 #include <string>
+
+enum class LDBMResult : int {
+    Ok = 0,
+    BadSourceIDs = -1,    // LDBMParseBigDB: the Spectra IDs are not exactly 0 .. N-1
+    CacheNotPlaced = 2,   // LDBMCreateSmallDB: the file cannot be opened or put in place
+    CacheNotWritten = 3,  // LDBMCreateSmallDB: a channel count other than 4 or 5, or a failed RR table
+    NoWriteAheadLog = 4,  // LDBMCreateSmallDB: write-ahead logging cannot be switched on
+};
+
+// The number a result is logged with.
+constexpr int LDBMCode(LDBMResult result) { return int(result); }
 
 // Consumer of the reference scan: one call per Spectra row. Returns 0 to go on.
 typedef int (*LDBMSpectrumConsumer)(void* userData, int id, float* xyz, float* spectrum, int sampleCount);
@@ -22,10 +34,10 @@ std::string LDBMSmallDBPath(int orientation);
 int LDBMReadInfoRow(void* context, int columns, char** values, char** names);
 
 // Streams every Spectra row of the reference file to `consumer`.
-// 0 on success; the open's code; -1 when the IDs are not exactly 0..N-1 once
+// Ok; the open's code; BadSourceIDs when the IDs are not exactly 0..N-1 once
 // each; otherwise the statement's code. A row without "ID", "X", "Y" or "Z",
 // or whose sample columns do not name every slot 0 .. C-5 once, stops the scan.
-int LDBMParseBigDB(const LDBMInfo* info, LDBMSpectrumConsumer consumer, void* userData, BigDBType type);
+LDBMResult LDBMParseBigDB(const LDBMInfo* info, LDBMSpectrumConsumer consumer, void* userData, BigDBType type);
 
 // Folds one reference spectrum with the channel spectra of `matrices`. Returns
 // non-zero (stopping the scan) when the row does not fit the record's arrays
@@ -38,21 +50,19 @@ constexpr int32_t LDBMMaxSources = 65536;
 
 // Reads the reference Info into `info`, then checks the cache for `orientation`;
 // when it is valid, sets *cacheValid and overwrites `info` with the cache's Info.
-// 0, the reference's open or statement code, or SQLITE_CORRUPT when the
+// Ok, the reference's open or statement code, or SQLITE_CORRUPT when the
 // reference gives a negative source count or more than LDBMMaxSources.
-int LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType type, float expectedSmallVersion);
+LDBMResult LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType type, float expectedSmallVersion);
 
 // Loads the cache's RR and XX tables into `responses` (responseRows x N) and
 // `xyz` (3 x N), N = info->sources. Columns for rows at or beyond `responseRows`
 // are skipped. A table with more rows than N stops with SQLITE_ABORT, one
 // with fewer gives SQLITE_CORRUPT.
-int LDBMParseSmallDB(int orientation, const LDBMInfo* info, float* xyz, float* responses, int responseRows);
+LDBMResult LDBMParseSmallDB(int orientation, const LDBMInfo* info, float* xyz, float* responses, int responseRows);
 
 // Writes the cache file: built whole beside it ("<cache>.tmp") and renamed
 // over it on success, so a failed write leaves the previous cache as it was.
-// 0; 2 when the file cannot be opened or put in place; 4 when write-ahead
-// logging cannot be switched on; 3 for a channel count other than 4 or 5 or a
-// failed RR table; otherwise the code of the failing statement or of the final
-// checkpoint.
-int LDBMCreateSmallDB(const LDBMInfo* info, const float* xyz, const float* responses, int orientation, int algo,
+// Ok; CacheNotPlaced, NoWriteAheadLog or CacheNotWritten as above; otherwise
+// the code of the failing statement or of the final checkpoint.
+LDBMResult LDBMCreateSmallDB(const LDBMInfo* info, const float* xyz, const float* responses, int orientation, int algo,
                       int channelCount, unsigned chipID, float smallVersion);

@@ -217,7 +217,7 @@ int putInPlace(const std::string& building, const std::string& cache)
 
 } // namespace
 
-int LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType type, float expectedSmallVersion)
+LDBMResult LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType type, float expectedSmallVersion)
 {
     *cacheValid = false;
     const std::string cache = cacheFile(orientation);
@@ -227,47 +227,47 @@ int LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType 
         SqliteConnection db;
         int rc = db.open(VPMapPath(LDBMBigDBPath(type)), SQLITE_OPEN_READONLY);
         if (rc != SQLITE_OK)
-            return rc;
+            return LDBMResult(rc);
         rc = db.exec("SELECT * FROM Info", LDBMReadInfoRow, &reference);
         os_log_debug(OS_LOG_DEFAULT, "BIG: DB version %f - %d samples", double(reference.version), reference.sources);
         if (rc != SQLITE_OK)
-            return rc;
+            return LDBMResult(rc);
     }
     // A negative source count cannot size a database, and a huge one would
     // have the event system's process allocate gigabytes for a broken file.
     if (reference.sources < 0 || reference.sources > LDBMMaxSources)
-        return SQLITE_CORRUPT;
+        return LDBMResult(SQLITE_CORRUPT);
     *info = reference;
 
     SqliteConnection db;
     if (db.open(cache, SQLITE_OPEN_READONLY) != SQLITE_OK)
-        return 0;
+        return LDBMResult::Ok;
     db.exec(kWriteAheadLog);
     LDBMInfo stored{0.0f, 0, 0, 0.0f, 0};
     if (db.exec("SELECT * FROM Info", LDBMReadInfoRow, &stored) != SQLITE_OK)
-        return 0; // no Info: a missing or unfinished cache
+        return LDBMResult::Ok; // no Info: a missing or unfinished cache
     os_log_debug(OS_LOG_DEFAULT, "SMALL: DB version %f - %d samples", double(stored.version), stored.sources);
     if (cacheMatches(stored, reference, expectedSmallVersion)) {
         *cacheValid = true;
         *info = stored;
     }
-    return 0;
+    return LDBMResult::Ok;
 }
 
-int LDBMParseSmallDB(int orientation, const LDBMInfo* info, float* xyz, float* responses, int responseRows)
+LDBMResult LDBMParseSmallDB(int orientation, const LDBMInfo* info, float* xyz, float* responses, int responseRows)
 {
     SqliteConnection db;
     int rc = db.open(cacheFile(orientation), SQLITE_OPEN_READONLY);
     if (rc != SQLITE_OK)
-        return rc;
+        return LDBMResult(rc);
     db.exec(kWriteAheadLog);
     rc = readTable(db, "SELECT * FROM RR", responses, info->sources, responseRows);
     if (rc != SQLITE_OK)
-        return rc;
-    return readTable(db, "SELECT * FROM XX", xyz, info->sources, 3);
+        return LDBMResult(rc);
+    return LDBMResult(readTable(db, "SELECT * FROM XX", xyz, info->sources, 3));
 }
 
-int LDBMCreateSmallDB(const LDBMInfo* info, const float* xyz, const float* responses, int orientation, int algo,
+LDBMResult LDBMCreateSmallDB(const LDBMInfo* info, const float* xyz, const float* responses, int orientation, int algo,
                       int channelCount, unsigned chipID, float smallVersion)
 {
     const std::string path = cacheFile(orientation);
@@ -281,5 +281,5 @@ int LDBMCreateSmallDB(const LDBMInfo* info, const float* xyz, const float* respo
         rc = putInPlace(building, path);
     if (rc != SQLITE_OK)
         removeDatabaseFiles(building);
-    return rc;
+    return LDBMResult(rc);
 }

@@ -37,10 +37,11 @@ void writeCache(Calibration& calibration, const SpectralDatabasePtr& db, const C
         VLOG_INFO("A newer database has been published; this one's cache is not written.\n");
         return;
     }
-    const int code = LDBMCreateSmallDB(&db->dbInfo, db->dbXYZ.data(), db->dbChannelResponses.data(), keys.orientation,
-                                       keys.algo, keys.channelCount, keys.chipId, kSmallDBVersion);
-    if (code != 0) {
-        VLOG_ERROR("Failed to create small DB %d\n", code);
+    const LDBMResult code = LDBMCreateSmallDB(&db->dbInfo, db->dbXYZ.data(), db->dbChannelResponses.data(),
+                                              keys.orientation, keys.algo, keys.channelCount, keys.chipId,
+                                              kSmallDBVersion);
+    if (code != LDBMResult::Ok) {
+        VLOG_ERROR("Failed to create small DB %d\n", LDBMCode(code));
         return;
     }
     VLOG_DEFAULT("Small DB has been created\n");

@@ -12,9 +12,9 @@ bool finishDatabaseBuild(Calibration& calibration, bool asyncCreate, Matrices& m
                          const std::shared_ptr<SpectralDatabase>& db)
 {
     VANTISH_ASSERT(calibration.lockHeldByCaller());
-    const int code = LDBMParseBigDB(&db->dbInfo, ProgressCallback, &matrices, BigDBTypeDefault);
-    if (code != 0) {
-        VLOG_ERROR("Failed to parse big DB %d\n", code);
+    const LDBMResult code = LDBMParseBigDB(&db->dbInfo, ProgressCallback, &matrices, BigDBTypeDefault);
+    if (code != LDBMResult::Ok) {
+        VLOG_ERROR("Failed to parse big DB %d\n", LDBMCode(code));
         return false;
     }
     VLOG_DEFAULT("Parsed big DB\n");

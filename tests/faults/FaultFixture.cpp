@@ -157,10 +157,10 @@ bool FaultTest::cacheValidFor(const unit::Reference& r, float smallVersion)
     const BigDBType type = std::string(r.file) == unit::kSecondReference.file ? BigDBType02 : BigDBTypeDefault;
     LDBMInfo info;
     bool valid = false;
-    if (LDBMInitialize(1, &info, &valid, type, smallVersion) != 0 || !valid)
+    if (LDBMInitialize(1, &info, &valid, type, smallVersion) != LDBMResult::Ok || !valid)
         return false;
     std::vector<float> xyz(3 * size_t(info.sources)), responses(unit::kChannels * size_t(info.sources));
-    if (LDBMParseSmallDB(1, &info, xyz.data(), responses.data(), int(unit::kChannels)) != 0)
+    if (LDBMParseSmallDB(1, &info, xyz.data(), responses.data(), int(unit::kChannels)) != LDBMResult::Ok)
         return false;
     return xyz[0] == r.xyz[0] && xyz[size_t(info.sources)] == r.xyz[1];
 }

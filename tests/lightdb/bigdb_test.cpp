@@ -54,7 +54,7 @@ TEST_F(BigDBTest, InfoRowIgnoresUnknownColumnsNullsAndLastRowWins)
     LDBMInfo info;
     info.sources = 99;
     bool valid = true;
-    ASSERT_EQ(LDBMInitialize(1, &info, &valid, BigDBTypeDefault, 1.1f), 0);
+    ASSERT_EQ(LDBMInitialize(1, &info, &valid, BigDBTypeDefault, 1.1f), LDBMResult::Ok);
     EXPECT_FALSE(valid);
     EXPECT_FLOAT_EQ(info.version, 2.25f);
     EXPECT_EQ(info.sources, 7); // the second row's NULL keeps the first row's value
@@ -86,7 +86,7 @@ TEST_F(BigDBTest, EveryIdMustAppearExactlyOnce)
         ldbtest::writeReference(bigDB(), "1.0", c.sources, rowsWithIds(c.ids));
         Recorder r;
         const LDBMInfo info = withSources(c.sources);
-        EXPECT_EQ(LDBMParseBigDB(&info, record, &r, BigDBTypeDefault), c.result) << ::testing::PrintToString(c.ids);
+        EXPECT_EQ(LDBMCode(LDBMParseBigDB(&info, record, &r, BigDBTypeDefault)), c.result) << ::testing::PrintToString(c.ids);
         EXPECT_EQ(r.ids, c.consumed) << ::testing::PrintToString(c.ids);
     }
 }
@@ -118,7 +118,7 @@ TEST_F(BigDBTest, RowsOutsideTheFormatStopTheScan)
         runSql(bigDB(), table);
         Recorder r;
         const LDBMInfo info = withSources(2);
-        EXPECT_EQ(LDBMParseBigDB(&info, record, &r, BigDBTypeDefault), -1) << table;
+        EXPECT_EQ(LDBMParseBigDB(&info, record, &r, BigDBTypeDefault), LDBMResult::BadSourceIDs) << table;
         EXPECT_LE(r.ids.size(), 1u) << table;
     }
 }
@@ -129,7 +129,7 @@ TEST_F(BigDBTest, SampleColumnsLandInTheSlotTheirNameGives)
                     "INSERT INTO Spectra VALUES (0.3, 0, 30, 0.1, 10, 0.2, 20);");
     Recorder r;
     const LDBMInfo info = withSources(1);
-    ASSERT_EQ(LDBMParseBigDB(&info, record, &r, BigDBTypeDefault), 0);
+    ASSERT_EQ(LDBMParseBigDB(&info, record, &r, BigDBTypeDefault), LDBMResult::Ok);
     ASSERT_EQ(r.ids.size(), 1u);
     EXPECT_EQ(r.xyz[0], (std::array<float, 3>{10.0f, 20.0f, 30.0f}));
     EXPECT_EQ(r.spectra[0], (std::vector<float>{0.1f, 0.2f, 0.3f}));
@@ -146,9 +146,9 @@ TEST_F(BigDBTest, TypeSelectsTheReferenceFile)
     for (int type : {0, 1, 2}) {
         LDBMInfo info;
         bool valid = false;
-        ASSERT_EQ(LDBMInitialize(1, &info, &valid, BigDBType(type), 1.1f), 0);
+        ASSERT_EQ(LDBMInitialize(1, &info, &valid, BigDBType(type), 1.1f), LDBMResult::Ok);
         Recorder r;
-        ASSERT_EQ(LDBMParseBigDB(&info, record, &r, BigDBType(type)), 0);
+        ASSERT_EQ(LDBMParseBigDB(&info, record, &r, BigDBType(type)), LDBMResult::Ok);
         const float expected = type == 0 ? 1.0f : 2.0f;
         EXPECT_FLOAT_EQ(info.version, expected) << type;
         EXPECT_FLOAT_EQ(r.xyz.at(0)[0], expected) << type;
@@ -159,11 +159,11 @@ TEST_F(BigDBTest, MissingReferenceFileCallsNothing)
 {
     Recorder r;
     const LDBMInfo info = withSources(1);
-    EXPECT_EQ(LDBMParseBigDB(&info, record, &r, BigDBTypeDefault), SQLITE_CANTOPEN);
+    EXPECT_EQ(LDBMParseBigDB(&info, record, &r, BigDBTypeDefault), LDBMResult(SQLITE_CANTOPEN));
     EXPECT_TRUE(r.ids.empty());
     LDBMInfo out;
     bool valid = true;
-    EXPECT_EQ(LDBMInitialize(1, &out, &valid, BigDBTypeDefault, 1.1f), SQLITE_CANTOPEN);
+    EXPECT_EQ(LDBMInitialize(1, &out, &valid, BigDBTypeDefault, 1.1f), LDBMResult(SQLITE_CANTOPEN));
     EXPECT_FALSE(valid);
 }
 
@@ -180,7 +180,7 @@ TEST_F(BigDBTest, MoreSourcesThanADatabaseCanHoldIsCorrupt)
         LDBMInfo info;
         bool valid = true;
         const bool tooMany = sources > LDBMMaxSources;
-        EXPECT_EQ(LDBMInitialize(1, &info, &valid, BigDBTypeDefault, 1.1f), tooMany ? SQLITE_CORRUPT : 0);
+        EXPECT_EQ(LDBMCode(LDBMInitialize(1, &info, &valid, BigDBTypeDefault, 1.1f)), tooMany ? SQLITE_CORRUPT : 0);
         // A refused Info leaves the caller's as it was.
         EXPECT_EQ(info.sources, tooMany ? 0 : LDBMMaxSources);
         if (!tooMany)

@@ -45,10 +45,9 @@ protected:
             return true;
         Matrices m = channelSpectra(channels);
         m.bindOutputs(db);
-        EXPECT_EQ(LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, BigDBTypeDefault), 0);
+        EXPECT_EQ(LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, BigDBTypeDefault), LDBMResult::Ok);
         EXPECT_EQ(LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(),
-                                    key.orientation, algo, channels, key.chipId, key.smallDBVersion),
-                  0);
+                                    key.orientation, algo, channels, key.chipId, key.smallDBVersion), LDBMResult::Ok);
         return false;
     }
 

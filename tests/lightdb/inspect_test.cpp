@@ -43,7 +43,7 @@ TEST_F(InspectTest, CacheFileWithoutNamesAndFailures)
 
     const LDBMInfo info{1.1f, 2, -1, -1.0f, 0};
     const std::vector<float> xyz(6, 1.0f), responses(8, 2.0f);
-    ASSERT_EQ(LDBMCreateSmallDB(&info, xyz.data(), responses.data(), 2, 3, 4, 0, 1.1f), 0);
+    ASSERT_EQ(LDBMCreateSmallDB(&info, xyz.data(), responses.data(), 2, 3, 4, 0, 1.1f), LDBMResult::Ok);
     const auto cache = cacheFile(2);
     const auto before = std::filesystem::last_write_time(cache);
     ASSERT_EQ(LDBMInspect(cache.string(), s), 0);

@@ -31,8 +31,8 @@ protected:
     int create(int channels = 5, unsigned chipID = 0x1234, float smallVersion = 1.3f, int orientation = 1)
     {
         const LDBMInfo reference{1.1f, kSources, -1, -1.0f, 0};
-        return LDBMCreateSmallDB(&reference, xyz.data(), responses.data(), orientation, 2, channels, chipID,
-                                 smallVersion);
+        return LDBMCode(LDBMCreateSmallDB(&reference, xyz.data(), responses.data(), orientation, 2, channels, chipID,
+                                          smallVersion));
     }
 
     // LDBMInitialize's verdict on the cache for orientation 1.
@@ -40,7 +40,7 @@ protected:
     {
         LDBMInfo info;
         bool cacheValid = false;
-        EXPECT_EQ(LDBMInitialize(1, &info, &cacheValid, BigDBTypeDefault, expectedSmallVersion), 0);
+        EXPECT_EQ(LDBMInitialize(1, &info, &cacheValid, BigDBTypeDefault, expectedSmallVersion), LDBMResult::Ok);
         if (out)
             *out = info;
         return cacheValid;
@@ -52,7 +52,7 @@ protected:
         loadedXYZ.assign(3 * kSources + 4, kGuard);
         loadedResponses.assign(size_t(responseRows * kSources) + 4, kGuard);
         const LDBMInfo info{1.1f, kSources, 0, 0.0f, 0};
-        return LDBMParseSmallDB(1, &info, loadedXYZ.data(), loadedResponses.data(), responseRows);
+        return LDBMCode(LDBMParseSmallDB(1, &info, loadedXYZ.data(), loadedResponses.data(), responseRows));
     }
 
     static bool guardsIntact(const std::vector<float>& v, size_t used)

@@ -70,7 +70,7 @@ TEST(ReferenceDatabase, ThePlugInReadsBothShippedFilesCompletely)
         EXPECT_EQ(info.version, file.version);
         EXPECT_EQ(size_t(info.sources), consumed.expected.size());
 
-        EXPECT_EQ(LDBMParseBigDB(&info, check, &consumed, type), 0);
+        EXPECT_EQ(LDBMParseBigDB(&info, check, &consumed, type), LDBMResult::Ok);
         EXPECT_EQ(consumed.rows, consumed.expected.size());
         EXPECT_EQ(consumed.mismatches, 0u);
     }
