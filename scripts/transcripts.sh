@@ -38,7 +38,7 @@ transcript() { # unit
 }
 
 blank() {
-    sed -e "s#$here#<source>#g" -e "s#$build#<build>#g" -e "s#$work#<work>#g" |
+    sed -e "s#$build#<build>#g" -e "s#$work#<work>#g" -e "s#$here#<source>#g" |
         grep -v -E '^(open|bring-up)( |$)'
 }
 
