@@ -5,6 +5,7 @@
 
 #include "support/LittleEndian.h"
 
+#include <algorithm>
 #include <array>
 #include <cstddef>
 #include <cstdint>
@@ -14,6 +15,9 @@
 struct ALSSampleRecord {
     // Bytes a record must have for every field below to be present.
     static constexpr size_t kSize = 137;
+    // Bytes up to the last field the filter reads (xyzSensor); filteredLux and
+    // filteredLuxValid after it are only logged.
+    static constexpr size_t kFilterSize = 132;
 
     // Field offsets in the driver's layout.
     static constexpr size_t kStatusOffset = 0;
@@ -58,12 +62,13 @@ struct ALSSampleRecord {
     float filteredLux = 0.0f;
     uint8_t filteredLuxValid = 0;
 
-    // The record in `bytes`, or nothing when they are too few to hold it.
-    // Bytes past the record are ignored.
+    // The record in `bytes`, or nothing when they are too few for the filter
+    // (kFilterSize); fields past the end of a shorter record read as 0. Bytes
+    // past the record are ignored.
     static std::optional<ALSSampleRecord> decode(std::span<const uint8_t> bytes);
 
     // Write-backs into a record's bytes; false (nothing written) when the
-    // bytes are too few to hold the record.
+    // bytes are too few for the filter.
     static bool writeChannelValues(std::span<uint8_t> bytes, const std::array<float, 6>& values);
     static bool writeXYZResult(std::span<uint8_t> bytes, const std::array<float, 3>& xyz);
 };
@@ -88,9 +93,9 @@ inline void putArray(std::span<uint8_t> bytes, size_t offset, const std::array<T
 
 inline std::optional<ALSSampleRecord> ALSSampleRecord::decode(std::span<const uint8_t> bytes)
 {
-    if (bytes.size() < kSize)
+    if (bytes.size() < kFilterSize)
         return std::nullopt;
-    const auto record = bytes.first(kSize);
+    const auto record = bytes.first(std::min(bytes.size(), kSize));
 
     ALSSampleRecord r;
     r.status = le::get<uint32_t>(record, kStatusOffset);
@@ -118,7 +123,7 @@ inline std::optional<ALSSampleRecord> ALSSampleRecord::decode(std::span<const ui
 
 inline bool ALSSampleRecord::writeChannelValues(std::span<uint8_t> bytes, const std::array<float, 6>& values)
 {
-    if (bytes.size() < kSize)
+    if (bytes.size() < kFilterSize)
         return false;
     sample_record_detail::putArray(bytes, kChannelValuesOffset, values);
     return true;
@@ -126,7 +131,7 @@ inline bool ALSSampleRecord::writeChannelValues(std::span<uint8_t> bytes, const 
 
 inline bool ALSSampleRecord::writeXYZResult(std::span<uint8_t> bytes, const std::array<float, 3>& xyz)
 {
-    if (bytes.size() < kSize)
+    if (bytes.size() < kFilterSize)
         return false;
     sample_record_detail::putArray(bytes, kXyzResultOffset, xyz);
     return true;

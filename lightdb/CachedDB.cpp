@@ -9,6 +9,13 @@
 // complete, so nothing here is ever seen half-written.
 bool processCachedDB(const CacheKey& key, int channelCount, BigDBType type, SpectralDatabase& db)
 {
+    // The arrays are sized from the channel count: one no record layout can
+    // carry is refused before anything is read or allocated.
+    if (channelCount < 1 || channelCount > kMaxDatabaseChannels) {
+        VLOG_ERROR("A per-chip database of %d channels cannot be kept (1 to %d)\n", channelCount,
+                   kMaxDatabaseChannels);
+        return false;
+    }
     const int cacheOrientation = key.orientation;
     bool valid = false;
     if (LDBMInitialize(cacheOrientation, &db.dbInfo, &valid, type, key.smallDBVersion) != LDBMResult::Ok) {

@@ -30,6 +30,7 @@ struct EventParts {
     const DatabaseSlot& databases;
     std::array<std::atomic<float>, 3>& lastXYZ;
     std::atomic<uint64_t>& shortRecords;
+    std::atomic<uint64_t>& nonFiniteLux;
 };
 
 constexpr uint32_t kMaxChannels = 6;
@@ -56,7 +57,17 @@ void reportShortRecord(std::atomic<uint64_t>& shortRecords, size_t length)
     const uint64_t count = shortRecords.fetch_add(1) + 1;
     if (count % kShortRecordLogInterval == 1)
         VLOG_ERROR("Sample record of %lu bytes is shorter than %lu bytes, event passed unchanged (%llu so far)\n",
-                   (unsigned long) length, (unsigned long) ALSSampleRecord::kSize, (unsigned long long) count);
+                   (unsigned long) length, (unsigned long) ALSSampleRecord::kFilterSize, (unsigned long long) count);
+}
+
+// A lux that is not a number cannot scale a colour: the sample gets none, as
+// one whose fit gives no positive Y. Logged like short records.
+void reportNonFiniteLux(std::atomic<uint64_t>& nonFiniteLux, float lux)
+{
+    const uint64_t count = nonFiniteLux.fetch_add(1) + 1;
+    if (count % kShortRecordLogInterval == 1)
+        VLOG_ERROR("Sample lux %f is not a finite number, colour set to zero (%llu so far)\n", double(lux),
+                   (unsigned long long) count);
 }
 
 // A spike zeroes the level now and the colour on the way out.
@@ -170,6 +181,10 @@ XYZ sampleColour(const EventParts& parts, IOHIDEventRef event, const SpectralDat
     if (sensorType != eALSSensorTypeVD6287)
         logSample(record, xyz);
 
+    if (!std::isfinite(record.lux)) {
+        reportNonFiniteLux(parts.nonFiniteLux, record.lux);
+        return {};
+    }
     xyz = scaleToLux(xyz, record.lux);
     if (record.xyzInRecord)
         logComparisonWithSensor(record, xyz);
@@ -210,7 +225,8 @@ void filterALSEvent(const EventParts& parts, IOHIDEventRef event)
 IOHIDEventRef VantishPlugIn::filter(IOHIDEventRef event, bool isCopyEvent)
 {
     if (isALSEvent(event))
-        filterALSEvent({unit_, fit_, overrides_, databases_, lastXYZ_, shortSampleRecords_}, event);
+        filterALSEvent({unit_, fit_, overrides_, databases_, lastXYZ_, shortSampleRecords_, nonFiniteLuxSamples_},
+                       event);
     logALSSample(event, isCopyEvent);
     return event;
 }

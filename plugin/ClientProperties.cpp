@@ -7,6 +7,7 @@
 #include "sysconfig/SysConfigCalibration.h"
 
 #include <algorithm>
+#include <cmath>
 #include <mutex>
 #include <optional>
 
@@ -32,7 +33,15 @@ const char* onOff(bool on) { return on ? "on" : "off"; }
 
 // A number switches the override on or off, keeping its values; an array of
 // one value per database channel sets them and switches it on.
-void setRGBCOverride(ClientOverrides& p, const UnitConfiguration& unit, CFTypeRef value)
+// The channels the filter feeds the fit with: those of the published database,
+// or before there is one, those the unit's configuration announces.
+uint32_t fittedChannels(const UnitConfiguration& unit, const DatabaseSlot& databases)
+{
+    const DatabaseSlot::Snapshot snapshot = databases.snapshot();
+    return snapshot.db ? snapshot.db->dbChannelCount : unit.dbChannelCount.load();
+}
+
+void setRGBCOverride(ClientOverrides& p, uint32_t channels, CFTypeRef value)
 {
     if (const auto on = intValue(value)) {
         p.rgbcOverrideActive = *on != 0;
@@ -40,7 +49,7 @@ void setRGBCOverride(ClientOverrides& p, const UnitConfiguration& unit, CFTypeRe
         return;
     }
     CFArrayRef array = asArray(value);
-    if (!array || CFArrayGetCount(array) != CFIndex(unit.dbChannelCount.load()))
+    if (!array || CFArrayGetCount(array) != CFIndex(channels))
         return;
     p.rgbcOverrideActive = 1;
     // The override holds six channels; a longer array has nowhere to go.
@@ -68,6 +77,14 @@ void setChromaticityOverride(ClientOverrides& p, CFTypeRef value)
     if (!array || CFArrayGetCount(array) < 2)
         return;
     const CFIndex count = CFArrayGetCount(array);
+    // x, y and Y that are not finite numbers would make every colour NaN or
+    // infinite: the whole setting is refused.
+    for (CFIndex i = 0; i < std::min<CFIndex>(count, 3); ++i) {
+        if (const auto component = doubleAt(array, i); component && !std::isfinite(*component)) {
+            VLOG_ERROR("Chromaticity override refused: component %d is not a finite number", int(i));
+            return;
+        }
+    }
     p.chromaticityOverrideActive = 1;
     if (const auto x = doubleAt(array, 0)) {
         p.overrideX = *x;
@@ -140,7 +157,7 @@ void VantishPlugIn::setPropertyForClient(CFStringRef key, CFTypeRef value, CFTyp
     if (!key)
         return;
     if (CFEqual(key, CFSTR("RGBCOverride")))
-        setRGBCOverride(overrides_, unit_, value);
+        setRGBCOverride(overrides_, fittedChannels(unit_, databases_), value);
     else if (CFEqual(key, CFSTR("ChromaticityOverride")))
         setChromaticityOverride(overrides_, value);
     else if (CFEqual(key, CFSTR("ColorAlgoLambda")))

@@ -94,8 +94,13 @@ void VantishPlugIn::open(IOHIDServiceRef openedService, IOOptionBits options)
     if (CFTypeRef id = IOHIDServiceGetRegistryID(openedService); isNumber(id))
         CFNumberGetValue(static_cast<CFNumberRef>(id), kCFNumberSInt64Type, &registryID);
     if (registryID != 0) {
-        io_service_t entry = IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(uint64_t(registryID)));
-        if (registryEntry_ && registryEntry_ != entry)
+        io_service_t entry =
+            IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(uint64_t(registryID)));
+        // The instance keeps one reference to its entry: the one it held is
+        // given back, or, when the lookup found the same entry again, the new one.
+        if (registryEntry_ && registryEntry_ == entry)
+            IOObjectRelease(entry);
+        else if (registryEntry_)
             IOObjectRelease(registryEntry_);
         registryEntry_ = entry;
     }

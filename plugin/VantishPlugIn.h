@@ -104,8 +104,10 @@ private:
     Calibration calibration_{host_, unit_, fit_, databases_};
 
     // The event path's own: the last colour (for copied events), the short
-    // records seen (to throttle their log line), and the clock's scale.
+    // records and non-finite lux values seen (to throttle their log lines),
+    // and the clock's scale.
     std::array<std::atomic<float>, 3> lastXYZ_{};
     std::atomic<uint64_t> shortSampleRecords_{0};
+    std::atomic<uint64_t> nonFiniteLuxSamples_{0};
     double machTimeToSeconds_ = 0.0; // set at construction
 };

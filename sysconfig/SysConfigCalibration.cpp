@@ -85,10 +85,15 @@ bool loadOrBuildDatabase(Calibration& calibration, bool asyncCreate, CFDataRef b
     const bool vd6286 = channels == 5 && entry.subHeader.chipType == kChipTypeVD6286;
     if (!generic && !vd6286)
         return resultSoFar;
+    // Without a database sized for the build (no reference to build from),
+    // the spectrum step still reads the entry (algorithm version, sample
+    // count and their log line) and then fails at the reference scan, which
+    // writes nothing: the generic step keeps the push's result, the VD6286
+    // step reports false.
     Matrices matrices;
     if (!prepareMatrices(*db, channels, matrices)) {
-        VLOG_ERROR("No reference database to build the per-chip database from.\n");
-        return resultSoFar;
+        matrices = Matrices{};
+        matrices.nChannels = int32_t(channels);
     }
     if (generic)
         return buildGenericSpectrum(calibration, asyncCreate, entry.bytes, header.revision, auxBlob, matrices, db) ||

@@ -70,6 +70,22 @@ void expectPrinted(const std::vector<float>& loaded, const std::vector<float>& b
 
 } // namespace
 
+TEST_F(CachedDBTest, ChannelCountsNoLayoutCarriesAreRefusedBeforeAnythingIsAllocated)
+{
+    for (int channels : {0, -1, 7, 300000}) {
+        log.clear();
+        SpectralDatabase db;
+        EXPECT_FALSE(processCachedDB(key, channels, BigDBTypeDefault, db)) << channels;
+        EXPECT_EQ(log.messages(), std::vector<std::string>{"A per-chip database of " + std::to_string(channels) +
+                                                           " channels cannot be kept (1 to 6)\n"});
+        EXPECT_EQ(db.dbSampleCount, 0u);
+        EXPECT_TRUE(db.dbChannelResponses.empty());
+    }
+    SpectralDatabase six;
+    EXPECT_FALSE(processCachedDB(key, 6, BigDBTypeDefault, six));
+    EXPECT_EQ(six.dbChannelCount, 6u) << "sized for a build";
+}
+
 TEST_F(CachedDBTest, MissingReferenceLeavesTheDatabaseAlone)
 {
     std::filesystem::remove(bigDB());

@@ -6,6 +6,9 @@
 
 #include <gtest/gtest.h>
 
+#include <limits>
+#include <string>
+
 using namespace sctest;
 
 namespace {
@@ -78,6 +81,16 @@ TEST_F(ClientProperties, RGBCArraysTakeOnlyNumbersAndTheDatabasesChannelCount)
     set("RGBCOverride", array({integer(11), string("x"), CFRetain(kCFBooleanTrue), integer(44)}));
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{11, 2, 3, 44, 0, 0}));
 
+    // The length that counts is that of the database the filter feeds.
+    auto five = std::make_shared<SpectralDatabase>();
+    five->allocate(3, 5);
+    parts(*plugin_).databases().publish(five, true);
+    set("RGBCOverride", array({integer(7), integer(7), integer(7), integer(7)}));
+    EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{11, 2, 3, 44, 0, 0}));
+    set("RGBCOverride", array({integer(5), integer(6), integer(7), integer(8), integer(9)}));
+    EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{5, 6, 7, 8, 9, 0}));
+    parts(*plugin_).databases().publish(nullptr, false);
+
     // Never stored past six values.
     parts(*plugin_).unit().dbChannelCount = 8;
     set("RGBCOverride", array({integer(1), integer(2), integer(3), integer(4), integer(5), integer(6), integer(7),
@@ -108,6 +121,28 @@ TEST_F(ClientProperties, ChromaticityWithTwoOrThreeValues)
     EXPECT_EQ(parts(*plugin_).overrides().chromaticityOverrideActive.load(), 0);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Chromaticity (xyY) override turned off"));
     EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideY.load(), 0.41);
+}
+
+TEST_F(ClientProperties, ChromaticityRefusesValuesThatAreNotFinite)
+{
+    const double nan = std::numeric_limits<double>::quiet_NaN(), inf = std::numeric_limits<double>::infinity();
+    vt::LogCapture log(VPLogLevel::Error);
+    for (int component = 0; component < 3; ++component) {
+        for (double bad : {nan, inf, -inf}) {
+            std::array<double, 3> xyY{0.3127, 0.3290, 100.0};
+            xyY[size_t(component)] = bad;
+            set("ChromaticityOverride", array({number(xyY[0]), number(xyY[1]), number(xyY[2])}));
+            EXPECT_EQ(parts(*plugin_).overrides().chromaticityOverrideActive.load(), 0);
+            EXPECT_DOUBLE_EQ(parts(*plugin_).overrides().overrideY.load(), 0.0);
+            EXPECT_TRUE(log.contains("Chromaticity override refused: component " + std::to_string(component) +
+                                     " is not a finite number"));
+        }
+    }
+    // Tiny values are numbers like any other.
+    const double denormal = std::numeric_limits<double>::denorm_min();
+    set("ChromaticityOverride", array({number(denormal), number(0.3290), number(denormal)}));
+    EXPECT_EQ(parts(*plugin_).overrides().chromaticityOverrideActive.load(), 1);
+    EXPECT_EQ(parts(*plugin_).overrides().overrideX.load(), denormal);
 }
 
 TEST_F(ClientProperties, ChromaticityIgnoresShortArraysAndNonNumbers)

@@ -8,6 +8,7 @@
 
 #include <cstdio>
 #include <functional>
+#include <limits>
 #include <string>
 
 using namespace alstest;
@@ -334,7 +335,8 @@ TEST_F(Filter, ShortRecordPassesUnchangedAndIsLoggedSparingly)
 {
     setLastXYZ(*plugin, 1, 2, 3);
     vt::LogCapture log(VPLogLevel::Error);
-    const Record truncated = Record(136).sampleChannelCount(4).channels({10, 20, 30, 40, 0, 0}).lux(100);
+    // One byte short of xyzSensor's end, the last field the filter reads.
+    const Record truncated = Record(131).sampleChannelCount(4).channels({10, 20, 30, 40, 0, 0}).lux(100);
     Event event = filter(truncated);
     EXPECT_EQ(colourSpaceOf(event.get()), 0);
     EXPECT_EQ(recordOf(event.get()), truncated.bytes());
@@ -344,9 +346,51 @@ TEST_F(Filter, ShortRecordPassesUnchangedAndIsLoggedSparingly)
         filter(truncated);
     const auto messages = log.messages();
     ASSERT_EQ(messages.size(), 2u);
-    EXPECT_EQ(messages[0], "Sample record of 136 bytes is shorter than 137 bytes, event passed unchanged (1 so far)\n");
+    EXPECT_EQ(messages[0], "Sample record of 131 bytes is shorter than 132 bytes, event passed unchanged (1 so far)\n");
     EXPECT_EQ(messages[1],
-              "Sample record of 136 bytes is shorter than 137 bytes, event passed unchanged (1001 so far)\n");
+              "Sample record of 131 bytes is shorter than 132 bytes, event passed unchanged (1001 so far)\n");
+}
+
+TEST_F(Filter, RecordsWithoutTheFilteredLuxFieldsGetColour)
+{
+    // filteredLux and filteredLuxValid (bytes 132 to 136) are only logged.
+    for (const size_t length : {size_t(132), size_t(136)}) {
+        const Record record = Record(length).sampleChannelCount(4).channels({10, 20, 30, 40, 0, 0}).lux(100);
+        Event event = filter(record);
+        EXPECT_EQ(colourSpaceOf(event.get()), 1) << length;
+        EXPECT_XYZ_NEAR(eventXYZ(event.get()), 20.0, 100.0, 80.0);
+
+        Event inRecord = filter(Record(record).xyzInRecord(1));
+        EXPECT_EQ(recordOf(inRecord.get()).size(), length);
+        EXPECT_XYZ_NEAR(xyzResultOf(inRecord.get()), 20.0, 100.0, 80.0);
+    }
+}
+
+TEST_F(Filter, LuxThatIsNotFiniteGivesZeroColour)
+{
+    const float nan = std::numeric_limits<float>::quiet_NaN(), inf = std::numeric_limits<float>::infinity();
+    vt::LogCapture log(VPLogLevel::Error);
+    setLastXYZ(*plugin, 1, 2, 3);
+    for (float lux : {nan, inf, -inf}) {
+        Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, lux));
+        EXPECT_EQ(colourSpaceOf(event.get()), 1);
+        EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{0, 0, 0}));
+        EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{0, 0, 0}));
+        Event inRecord = filter(fourChannels({10, 20, 30, 40, 0, 0}, lux).xyzInRecord(1));
+        EXPECT_EQ(xyzResultOf(inRecord.get()), (std::array<float, 3>{0, 0, 0}));
+    }
+    // Logged like short records: the first, then every thousandth.
+    for (int i = 0; i < 995; ++i)
+        filter(fourChannels({10, 20, 30, 40, 0, 0}, nan));
+    const auto messages = log.messages();
+    ASSERT_EQ(messages.size(), 2u);
+    EXPECT_EQ(messages[0], "Sample lux nan is not a finite number, colour set to zero (1 so far)\n");
+    EXPECT_EQ(messages[1], "Sample lux nan is not a finite number, colour set to zero (1001 so far)\n");
+
+    // A denormal lux is a number: the colour is scaled to it.
+    const float tiny = std::numeric_limits<float>::denorm_min();
+    Event event = filter(fourChannels({10, 20, 30, 40, 0, 0}, tiny));
+    EXPECT_EQ(eventXYZ(event.get())[1], double(tiny));
 }
 
 TEST_F(Filter, LongRecordIsReadAndWrittenOnlyWithinItsFields)

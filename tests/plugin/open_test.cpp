@@ -204,6 +204,11 @@ TEST_F(Open, RegistryHandleIsReleasedWithTheInstance)
     other->open(service, 0);
     VPDispatchDrain();
     EXPECT_EQ(VPRegistryOutstandingReferences(entry), 1);
+    // A second open finds the same entry again: the instance still holds one reference.
+    other->open(service, 0);
+    VPDispatchDrain();
+    EXPECT_EQ(VPRegistryOutstandingReferences(entry), 1);
+    EXPECT_EQ(parts(*other).registryEntry(), entry);
     other->Release();
     EXPECT_EQ(VPRegistryOutstandingReferences(entry), 0);
 }

@@ -118,14 +118,28 @@ TEST_F(Database, UnusableSpectrumBlocksBuildNothing)
     }
 }
 
-TEST_F(Database, MissingReferenceDatabaseKeepsThePushResult)
+TEST_F(Database, MissingReferenceDatabase)
 {
+    // The spectrum steps still read their entry (algorithm version, sample
+    // count, their line); the scan then fails. The generic step keeps the
+    // push's result, the VD6286 step reports its own failure.
     std::filesystem::remove(system_.path() / "Vantish.plugin" / "bzlight.sqlite");
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
     vt::LogCapture log;
     EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), false, true, true));
     EXPECT_TRUE(log.contains("Database not found!\n"));
+    EXPECT_TRUE(log.contains("Algo version: 3 NSamples: 401\n"));
+    EXPECT_EQ(parts(*plugin_).unit().spectrumSampleCount.load(), 401u);
     EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), false, false, true));
+    EXPECT_EQ(parts(*plugin_).databases().snapshot().db, nullptr);
+
+    log.clear();
+    parts(*plugin_).unit().algoVersion = 0;
+    publish("alsCalibration", blob({VD6286Entry{}.bytes()}));
+    EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), false, true, true));
+    EXPECT_EQ(VPServiceReceivedCount(service_, CFSTR("ALSCalibrationData")), 2u) << "the record was pushed";
+    EXPECT_TRUE(log.contains("Algo version: 2 NSamples: 401\n"));
+    EXPECT_EQ(parts(*plugin_).unit().algoVersion.load(), 2);
     EXPECT_EQ(parts(*plugin_).databases().snapshot().db, nullptr);
 }
 
