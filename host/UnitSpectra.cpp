@@ -1,6 +1,6 @@
 #include "host/UnitSpectra.h"
 
-#include "host/calib/CalibCodec.h"
+#include "host/recordcodec/RecordCodec.h"
 
 #include <CoreFoundation/CoreFoundation.h>
 
@@ -18,7 +18,7 @@ namespace host {
 
 namespace {
 
-using calibcodec::Json;
+using recordcodec::Json;
 
 constexpr unsigned kMaxReportedChannels = 6;
 // The plug-in scales the last 196 samples (710–1100 nm) for infrared compensation.
@@ -93,9 +93,9 @@ spectra::Spectrum sampleMajorChannel(const std::vector<double>& samples, size_t 
 }
 
 Json decodeRecord(const DeviceDescription& unit, const std::vector<uint8_t>& bytes,
-                  std::optional<calibcodec::Kind> kind, const std::string& what)
+                  std::optional<recordcodec::Kind> kind, const std::string& what)
 {
-    auto decoded = calibcodec::decode(bytes, kind);
+    auto decoded = recordcodec::decode(bytes, kind);
     if (!decoded)
         fail(unit, what + ": " + decoded.error);
     return std::move(*decoded.value);
@@ -207,27 +207,27 @@ UnitSpectra fromFactoryStore(const DeviceDescription& unit)
         const auto bytes = readFile(path);
         if (!bytes)
             continue;
-        const auto kind = calibcodec::kindForSize(bytes->size());
+        const auto kind = recordcodec::kindForSize(bytes->size());
         const std::string what = path.string();
         const Json record = decodeRecord(unit, *bytes, std::nullopt, what);
         const Json& fields = record["fields"];
         UnitSpectra out;
         switch (*kind) {
-        case calibcodec::Kind::XwCl:
+        case recordcodec::Kind::XwCl:
             out = fromXwCl(unit, fields, what);
             break;
-        case calibcodec::Kind::XwCAT2:
+        case recordcodec::Kind::XwCAT2:
             out = fromXwCAT2(unit, fields, what);
             break;
-        case calibcodec::Kind::VD6287v1:
-        case calibcodec::Kind::VD6287v3:
+        case recordcodec::Kind::VD6287v1:
+        case recordcodec::Kind::VD6287v3:
             out = fromVD6287(fields);
             break;
         default:
-            fail(unit, what + ": a " + std::string(calibcodec::kindName(*kind)) +
+            fail(unit, what + ": a " + std::string(recordcodec::kindName(*kind)) +
                            " record is not a factory calibration the plug-in reads");
         }
-        out.origin = "factory store class " + cls + " (" + what + ", " + std::string(calibcodec::kindName(*kind)) + ")";
+        out.origin = "factory store class " + cls + " (" + what + ", " + std::string(recordcodec::kindName(*kind)) + ")";
         return out;
     }
     fail(unit, "the factory store " + unit.factoryStore->string() + " holds no record of class " + classes[0] +
@@ -324,7 +324,7 @@ UnitSpectra fromRegistry(const DeviceDescription& unit)
                    "\"alsCalibration\" data");
     const uint32_t orientation = orientationOf(unit);
     const std::string what = "\"alsCalibration\"";
-    const Json record = decodeRecord(unit, *blob, calibcodec::Kind::AlsCalibration, what);
+    const Json record = decodeRecord(unit, *blob, recordcodec::Kind::AlsCalibration, what);
     const Json& fields = record["fields"];
     if (number(at(fields, {"header", "version"})) != 1)
         fail(unit, what + ": calibration version " + std::to_string(int(number(at(fields, {"header", "version"})))) +
@@ -356,7 +356,7 @@ UnitSpectra fromRegistry(const DeviceDescription& unit)
         out.luxCoefficients.push_back(c < weights.size() ? weights[c] : 0.0);
     }
     if (const auto aux = registryData(unit, "alsAuxCalibration")) {
-        const Json auxRecord = decodeRecord(unit, *aux, calibcodec::Kind::AlsAuxCalibration, "\"alsAuxCalibration\"");
+        const Json auxRecord = decodeRecord(unit, *aux, recordcodec::Kind::AlsAuxCalibration, "\"alsAuxCalibration\"");
         if (const Json* auxEntry = entryFor(auxRecord["fields"], orientation)) {
             compensateInfrared(out, numbers(at(*auxEntry, {"irCoefficients"})));
             out.origin += ", infrared compensation from \"alsAuxCalibration\"";

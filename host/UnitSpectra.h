@@ -7,7 +7,7 @@
 // infrared compensation of "alsAuxCalibration") when the service asks for
 // configuration-supplied calibration, else the first factory-store class the
 // plug-in reads ("XwCA" then "XwCl", or "XwCM" then "XwCA" on Dravik OS).
-// Records are decoded with the calibration codec (host/calib/CalibCodec.h).
+// Records are decoded with the record codec (host/recordcodec/RecordCodec.h).
 #pragma once
 
 #include "host/DeviceDescription.h"

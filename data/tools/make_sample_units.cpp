@@ -1,5 +1,5 @@
 // Writes the calibration records of the sample units in data/devices: for
-// each record its JSON form (as the calibration codec decodes it) and its
+// each record its JSON form (as the record codec decodes it) and its
 // bytes (as the codec encodes that JSON), or checks the stored files.
 //
 //   make_sample_units DATADIR          write DATADIR/devices/<unit>/...
@@ -12,7 +12,7 @@
 // Every other value is a plausible, made-up calibration; data/devices/README.md
 // lists them. The device descriptions (device.json) are written by hand.
 
-#include "host/calib/CalibCodec.h"
+#include "host/recordcodec/RecordCodec.h"
 #include "spectra/SensorModel.h"
 
 #include <CLI/CLI.hpp>
@@ -33,7 +33,7 @@
 namespace {
 
 namespace fs = std::filesystem;
-using calibcodec::Json;
+using recordcodec::Json;
 using spectra::SensorModel;
 
 constexpr double kFullScaleShare = 0.9;
@@ -520,12 +520,12 @@ struct Output {
 // The record's bytes from the codec, and the codec's own JSON form of them.
 Output produce(const StoredRecord& r)
 {
-    const auto encoded = calibcodec::encode(r.source);
+    const auto encoded = recordcodec::encode(r.source);
     if (!encoded)
         throw std::runtime_error(r.binary + ": " + encoded.error);
     const std::vector<uint8_t>& bytes = *encoded.value;
-    const auto kind = calibcodec::kindNamed(r.source["format"].get<std::string>());
-    const auto decoded = calibcodec::decode(bytes, kind);
+    const auto kind = recordcodec::kindNamed(r.source["format"].get<std::string>());
+    const auto decoded = recordcodec::decode(bytes, kind);
     if (!decoded)
         throw std::runtime_error(r.binary + ": " + decoded.error);
     Output out{std::string(bytes.begin(), bytes.end()), {}};

@@ -2,7 +2,7 @@
 // blobs, driver records) as readable JSON and back, byte for byte.
 #include "host/vantish/Commands.h"
 
-#include "host/calib/CalibCodec.h"
+#include "host/recordcodec/RecordCodec.h"
 
 #include <fstream>
 #include <iostream>
@@ -21,8 +21,8 @@ struct CalibOptions {
 std::string formatList()
 {
     std::string list;
-    for (calibcodec::Kind kind : calibcodec::allKinds())
-        list += (list.empty() ? "" : ", ") + std::string(calibcodec::kindName(kind));
+    for (recordcodec::Kind kind : recordcodec::allKinds())
+        list += (list.empty() ? "" : ", ") + std::string(recordcodec::kindName(kind));
     return list;
 }
 
@@ -42,15 +42,15 @@ int decodeRecord(const CalibOptions& o)
         std::cerr << "vantish: cannot read " << o.input << "\n";
         return 2;
     }
-    std::optional<calibcodec::Kind> kind;
+    std::optional<recordcodec::Kind> kind;
     if (!o.format.empty()) {
-        kind = calibcodec::kindNamed(o.format);
+        kind = recordcodec::kindNamed(o.format);
         if (!kind) {
             std::cerr << "vantish: unknown format '" << o.format << "' (one of " << formatList() << ")\n";
             return 2;
         }
     }
-    auto decoded = calibcodec::decode(bytes, kind);
+    auto decoded = recordcodec::decode(bytes, kind);
     if (!decoded) {
         std::cerr << "vantish: " << o.input << ": " << decoded.error << "\n";
         return 1;
@@ -76,14 +76,14 @@ int encodeRecord(const CalibOptions& o)
         std::cerr << "vantish: cannot read " << o.input << "\n";
         return 2;
     }
-    calibcodec::Json json;
+    recordcodec::Json json;
     try {
-        json = calibcodec::Json::parse(in);
+        json = recordcodec::Json::parse(in);
     } catch (const std::exception& e) {
         std::cerr << "vantish: " << o.input << ": not valid JSON: " << e.what() << "\n";
         return 1;
     }
-    auto encoded = calibcodec::encode(json);
+    auto encoded = recordcodec::encode(json);
     if (!encoded) {
         std::cerr << "vantish: " << o.input << ": " << encoded.error << "\n";
         return 1;

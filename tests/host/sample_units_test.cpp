@@ -6,7 +6,7 @@
 #include "host/Bundle.h"
 #include "host/DeviceDescription.h"
 #include "host/Unit.h"
-#include "host/calib/CalibCodec.h"
+#include "host/recordcodec/RecordCodec.h"
 #include "spectra/CieIlluminants.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
@@ -111,8 +111,8 @@ TEST(SampleUnits, StoredRecordsAreTheCodecEncodingOfTheirJson)
             SCOPED_TRACE(binary.string());
             std::ifstream in(jsonSourceOf(binary));
             ASSERT_TRUE(in) << "no JSON source";
-            const calibcodec::Json source = calibcodec::Json::parse(in);
-            const auto encoded = calibcodec::encode(source);
+            const recordcodec::Json source = recordcodec::Json::parse(in);
+            const auto encoded = recordcodec::encode(source);
             ASSERT_TRUE(encoded) << encoded.error;
             EXPECT_TRUE(*encoded.value == readBytes(binary)) << "the stored bytes are not the encoded JSON";
         }

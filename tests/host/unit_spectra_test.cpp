@@ -5,7 +5,7 @@
 #include "host/SyntheticReading.h"
 #include "host/Unit.h"
 #include "host/UnitSpectra.h"
-#include "host/calib/CalibCodec.h"
+#include "host/recordcodec/RecordCodec.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
 #include "support/TestSupport.h"
@@ -124,7 +124,7 @@ TEST(UnitSpectra, XwClChipTypesMapTheColumnsAsThePlugInFoldsThem)
         const host::DeviceDescription original = unit(name);
         const std::string storeClass = std::string(name) == "xwcl-62" ? "XwCA" : "XwCl";
         std::ifstream in(*original.factoryStore / (storeClass + ".json"));
-        calibcodec::Json record = calibcodec::Json::parse(in);
+        recordcodec::Json record = recordcodec::Json::parse(in);
         const host::UnitSpectra plain = host::loadUnitSpectra(original);
         const size_t n = plain.channelCount();
         const size_t skip = n == 6 ? 1 : 0; // the 6-channel record keeps channel 0 out of the fit
@@ -132,7 +132,7 @@ TEST(UnitSpectra, XwClChipTypesMapTheColumnsAsThePlugInFoldsThem)
         for (int chipType : {1, 2}) {
             SCOPED_TRACE(std::string(name) + " chip type " + std::to_string(chipType));
             record["fields"]["header"]["chipType"] = chipType;
-            const auto bytes = calibcodec::encode(record);
+            const auto bytes = recordcodec::encode(record);
             ASSERT_TRUE(bytes) << bytes.error;
             vt::TempDir store;
             std::ofstream(store.path() / storeClass, std::ios::binary)

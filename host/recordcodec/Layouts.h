@@ -3,9 +3,9 @@
 #pragma once
 
 #include "formats/DriverRecordLayouts.h"
-#include "host/calib/FieldLayout.h"
+#include "host/recordcodec/FieldLayout.h"
 
-namespace calibcodec {
+namespace recordcodec {
 
 // Factory-data store records.
 void describeXwCl(const Describer& d);
@@ -22,4 +22,4 @@ void describeChannelRecord(const Describer& d, const driver::ChannelRecordLayout
 void describeVD6287Record(const Describer& d);
 void describeColorCalibration(const Describer& d);
 
-} // namespace calibcodec
+} // namespace recordcodec

@@ -1,6 +1,6 @@
-#include "host/calib/Layouts.h"
+#include "host/recordcodec/Layouts.h"
 
-namespace calibcodec {
+namespace recordcodec {
 namespace {
 
 using T = FieldType;
@@ -84,4 +84,4 @@ void describeColorCalibration(const Describer& d)
     d.array("responses", r::responses, T::F32, r::responseSlots);
 }
 
-} // namespace calibcodec
+} // namespace recordcodec

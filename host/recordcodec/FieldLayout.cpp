@@ -1,4 +1,4 @@
-#include "host/calib/FieldLayout.h"
+#include "host/recordcodec/FieldLayout.h"
 
 #include "support/LittleEndian.h"
 
@@ -9,7 +9,7 @@
 #include <limits>
 #include <stdexcept>
 
-namespace calibcodec {
+namespace recordcodec {
 namespace {
 
 struct Range {
@@ -415,4 +415,4 @@ std::string hexOf(std::span<const uint8_t> bytes)
     return out;
 }
 
-} // namespace calibcodec
+} // namespace recordcodec

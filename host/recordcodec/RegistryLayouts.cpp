@@ -3,9 +3,9 @@
 // "alsAuxCalibration": the same framing with infrared compensation
 // coefficients. Entries are walked as the plug-in walks them; each entry's
 // fields are kept inside the entry.
-#include "host/calib/Layouts.h"
+#include "host/recordcodec/Layouts.h"
 
-namespace calibcodec {
+namespace recordcodec {
 namespace {
 
 using T = FieldType;
@@ -121,4 +121,4 @@ void describeAlsAuxCalibration(const Describer& d)
     });
 }
 
-} // namespace calibcodec
+} // namespace recordcodec

@@ -1,15 +1,15 @@
-#include "host/calib/CalibCodec.h"
+#include "host/recordcodec/RecordCodec.h"
 
 #include "formats/DriverRecordLayouts.h"
 #include "formats/VD6287Layout.h"
 #include "formats/XwCAT2Layout.h"
 #include "formats/XwClLayout.h"
-#include "host/calib/Layouts.h"
+#include "host/recordcodec/Layouts.h"
 
 #include <algorithm>
 #include <stdexcept>
 
-namespace calibcodec {
+namespace recordcodec {
 namespace {
 
 struct KindInfo {
@@ -240,4 +240,4 @@ Result<std::vector<uint8_t>> encode(const Json& record)
     }
 }
 
-} // namespace calibcodec
+} // namespace recordcodec

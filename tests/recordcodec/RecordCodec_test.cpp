@@ -1,4 +1,4 @@
-#include "host/calib/CalibCodec.h"
+#include "host/recordcodec/RecordCodec.h"
 
 #include <gtest/gtest.h>
 
@@ -8,8 +8,8 @@
 
 namespace {
 
-using calibcodec::Json;
-using calibcodec::Kind;
+using recordcodec::Json;
+using recordcodec::Kind;
 
 std::vector<uint8_t> randomBytes(size_t size, unsigned seed)
 {
@@ -23,11 +23,11 @@ std::vector<uint8_t> randomBytes(size_t size, unsigned seed)
 // Decodes, passes the JSON through its text form, encodes.
 std::vector<uint8_t> roundTrip(const std::vector<uint8_t>& bytes, std::optional<Kind> kind = std::nullopt)
 {
-    auto decoded = calibcodec::decode(bytes, kind);
+    auto decoded = recordcodec::decode(bytes, kind);
     EXPECT_TRUE(decoded) << decoded.error;
     if (!decoded)
         return {};
-    auto encoded = calibcodec::encode(Json::parse(decoded.value->dump()));
+    auto encoded = recordcodec::encode(Json::parse(decoded.value->dump()));
     EXPECT_TRUE(encoded) << encoded.error;
     return encoded ? *encoded.value : std::vector<uint8_t>{};
 }
@@ -46,11 +46,11 @@ struct Writer {
     }
 };
 
-TEST(CalibCodecTest, EveryFixedSizeRecordRoundTripsWhateverItsBytes)
+TEST(RecordCodecTest, EveryFixedSizeRecordRoundTripsWhateverItsBytes)
 {
     for (size_t size : {5156, 10236, 9962, 10440, 10348, 145, 193, 220, 776, 28163}) {
         SCOPED_TRACE(size);
-        ASSERT_TRUE(calibcodec::kindForSize(size));
+        ASSERT_TRUE(recordcodec::kindForSize(size));
         const std::vector<uint8_t> bytes = randomBytes(size, unsigned(size));
         EXPECT_EQ(roundTrip(bytes), bytes);
     }
@@ -76,10 +76,10 @@ std::vector<uint8_t> registryBlob()
     return b;
 }
 
-TEST(CalibCodecTest, RegistryBlobIsWalkedEntryByEntry)
+TEST(RecordCodecTest, RegistryBlobIsWalkedEntryByEntry)
 {
     const std::vector<uint8_t> blob = registryBlob();
-    auto decoded = calibcodec::decode(blob, Kind::AlsCalibration);
+    auto decoded = recordcodec::decode(blob, Kind::AlsCalibration);
     ASSERT_TRUE(decoded) << decoded.error;
     const Json& fields = (*decoded.value)["fields"];
     const Json& generic = fields["entries"][0];
@@ -99,7 +99,7 @@ TEST(CalibCodecTest, RegistryBlobIsWalkedEntryByEntry)
     EXPECT_EQ(roundTrip(blob, Kind::AlsCalibration), blob);
 }
 
-TEST(CalibCodecTest, ArbitraryRegistryBytesRoundTrip)
+TEST(RecordCodecTest, ArbitraryRegistryBytesRoundTrip)
 {
     for (unsigned seed = 1; seed <= 20; ++seed) {
         std::vector<uint8_t> blob = randomBytes(600 + 97 * seed, seed);
@@ -110,14 +110,14 @@ TEST(CalibCodecTest, ArbitraryRegistryBytesRoundTrip)
     }
 }
 
-TEST(CalibCodecTest, AuxiliaryBlobCoefficientsAreConverted)
+TEST(RecordCodecTest, AuxiliaryBlobCoefficientsAreConverted)
 {
     std::vector<uint8_t> blob(8 + 2 * 56, 0);
     Writer w{blob};
     w.u8(2, 2);
     w.u8(8 + 2, 1), w.u16(8 + 4, 56), w.u32(8 + 40, uint32_t(-250000));
     w.u8(64 + 2, 3), w.u16(64 + 4, 56), w.u32(64 + 52, 2000000);
-    auto decoded = calibcodec::decode(blob, Kind::AlsAuxCalibration);
+    auto decoded = recordcodec::decode(blob, Kind::AlsAuxCalibration);
     ASSERT_TRUE(decoded);
     const Json& entries = (*decoded.value)["fields"]["entries"];
     EXPECT_EQ(entries[0]["irCoefficients"]["value"][0], -0.25);
@@ -125,14 +125,14 @@ TEST(CalibCodecTest, AuxiliaryBlobCoefficientsAreConverted)
     EXPECT_EQ(entries[1]["irCoefficients"]["value"][3], 2.0);
 }
 
-TEST(CalibCodecTest, DriverRecordFieldsAreNamedAndConverted)
+TEST(RecordCodecTest, DriverRecordFieldsAreNamedAndConverted)
 {
     std::vector<uint8_t> record(193, 0);
     Writer w{record};
     w.u8(0, 1), w.u32(1, 3), w.u16(10, 193), w.u16(12, 0x4000), w.u16(20, 62);
     w.f32(28 + 4, 0.0086f), w.f32(48, std::nanf(""));
     w.u16(68 + 1, uint16_t(-512)), w.u16(68 + 5, uint16_t(-3)), w.u16(68 + 7, 0x8000);
-    auto decoded = calibcodec::decode(record);
+    auto decoded = recordcodec::decode(record);
     ASSERT_TRUE(decoded);
     const Json& f = (*decoded.value)["fields"];
     EXPECT_EQ((*decoded.value)["format"], "driver-5-channel");
@@ -149,11 +149,11 @@ TEST(CalibCodecTest, DriverRecordFieldsAreNamedAndConverted)
     EXPECT_EQ(roundTrip(record), record);
 }
 
-TEST(CalibCodecTest, FactoryRecordsKeepReservedBytes)
+TEST(RecordCodecTest, FactoryRecordsKeepReservedBytes)
 {
     std::vector<uint8_t> xwca = randomBytes(9962, 3);
     std::memcpy(xwca.data() + 16, "1A2B3C4D", 8);
-    auto decoded = calibcodec::decode(xwca);
+    auto decoded = recordcodec::decode(xwca);
     ASSERT_TRUE(decoded);
     EXPECT_EQ((*decoded.value)["fields"]["chipID"]["text"], "1A2B3C4D");
     // Bytes 0 to 3 carry no field.
@@ -163,22 +163,22 @@ TEST(CalibCodecTest, FactoryRecordsKeepReservedBytes)
 
     std::vector<uint8_t> v1 = randomBytes(10440, 4);
     v1[80 + 137] = 0xFD;
-    auto v1Decoded = calibcodec::decode(v1);
+    auto v1Decoded = recordcodec::decode(v1);
     ASSERT_TRUE(v1Decoded);
     EXPECT_EQ((*v1Decoded.value)["fields"]["blobs"][0]["channels"][0]["channelByte"], -3);
 }
 
-TEST(CalibCodecTest, EditedValuesAreEncodedFromRawOrConvertedForm)
+TEST(RecordCodecTest, EditedValuesAreEncodedFromRawOrConvertedForm)
 {
     std::vector<uint8_t> record(145, 0);
-    auto decoded = calibcodec::decode(record);
+    auto decoded = recordcodec::decode(record);
     ASSERT_TRUE(decoded);
     Json edited = *decoded.value;
     edited["fields"]["fudge"] = Json{{"value", 1.25}};
     edited["fields"]["luxCoeff"] = Json{{"raw", {1, 2, 3, 11658}}};
     edited["fields"]["channels"][2]["gainScale"].erase("raw");
     edited["fields"]["channels"][2]["gainScale"]["value"][8] = 0.5;
-    auto encoded = calibcodec::encode(edited);
+    auto encoded = recordcodec::encode(edited);
     ASSERT_TRUE(encoded) << encoded.error;
     const std::vector<uint8_t>& b = *encoded.value;
     EXPECT_EQ(b[12] | b[13] << 8, 0x5000);
@@ -186,29 +186,29 @@ TEST(CalibCodecTest, EditedValuesAreEncodedFromRawOrConvertedForm)
     EXPECT_EQ(b[49 + 48 + 6 + 16] | b[49 + 48 + 6 + 17] << 8, 0x2000);
 }
 
-TEST(CalibCodecTest, MalformedInputIsReportedNotGuessed)
+TEST(RecordCodecTest, MalformedInputIsReportedNotGuessed)
 {
-    EXPECT_FALSE(calibcodec::decode(std::vector<uint8_t>(146)));
-    EXPECT_FALSE(calibcodec::decode(std::vector<uint8_t>(146), Kind::Driver4Channel));
-    EXPECT_TRUE(calibcodec::decode(std::vector<uint8_t>(3), Kind::AlsCalibration)); // what there is of the header
+    EXPECT_FALSE(recordcodec::decode(std::vector<uint8_t>(146)));
+    EXPECT_FALSE(recordcodec::decode(std::vector<uint8_t>(146), Kind::Driver4Channel));
+    EXPECT_TRUE(recordcodec::decode(std::vector<uint8_t>(3), Kind::AlsCalibration)); // what there is of the header
 
-    auto decoded = calibcodec::decode(std::vector<uint8_t>(145));
+    auto decoded = recordcodec::decode(std::vector<uint8_t>(145));
     ASSERT_TRUE(decoded);
     Json tooLarge = *decoded.value;
     tooLarge["fields"]["nChannels"] = 300;
-    auto encoded = calibcodec::encode(tooLarge);
+    auto encoded = recordcodec::encode(tooLarge);
     EXPECT_FALSE(encoded);
     EXPECT_EQ(encoded.error, "nChannels: value 300 does not fit the field");
 
     Json wrongSize = *decoded.value;
     wrongSize["size"] = 146;
-    EXPECT_FALSE(calibcodec::encode(wrongSize));
+    EXPECT_FALSE(recordcodec::encode(wrongSize));
     Json unknown = *decoded.value;
     unknown["format"] = "driver-7-channel";
-    EXPECT_FALSE(calibcodec::encode(unknown));
+    EXPECT_FALSE(recordcodec::encode(unknown));
     Json badUnnamed = *decoded.value;
     badUnnamed["unnamed"] = Json::array({Json{{"offset", 144}, {"hex", "0102"}}});
-    EXPECT_FALSE(calibcodec::encode(badUnnamed));
+    EXPECT_FALSE(recordcodec::encode(badUnnamed));
 }
 
 } // namespace

@@ -1,9 +1,9 @@
 #include "formats/VD6287Layout.h"
 #include "formats/XwCAT2Layout.h"
 #include "formats/XwClLayout.h"
-#include "host/calib/Layouts.h"
+#include "host/recordcodec/Layouts.h"
 
-namespace calibcodec {
+namespace recordcodec {
 namespace {
 
 using T = FieldType;
@@ -174,4 +174,4 @@ void describeVD6287v1(const Describer& d)
     }
 }
 
-} // namespace calibcodec
+} // namespace recordcodec

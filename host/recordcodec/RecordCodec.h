@@ -11,7 +11,7 @@
 // converted value; a field missing from the JSON is written as zero.
 #pragma once
 
-#include "host/calib/FieldLayout.h"
+#include "host/recordcodec/FieldLayout.h"
 
 #include <cstdint>
 #include <optional>
@@ -20,7 +20,7 @@
 #include <string_view>
 #include <vector>
 
-namespace calibcodec {
+namespace recordcodec {
 
 enum class Kind {
     XwCl,              // factory XwCl, one or two entries (5156, 10236 bytes)
@@ -56,4 +56,4 @@ Result<Json> decode(std::span<const uint8_t> bytes, std::optional<Kind> kind = s
 // Encodes a JSON record of the form decode produces.
 Result<std::vector<uint8_t>> encode(const Json& record);
 
-} // namespace calibcodec
+} // namespace recordcodec

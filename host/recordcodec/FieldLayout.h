@@ -13,7 +13,7 @@
 #include <variant>
 #include <vector>
 
-namespace calibcodec {
+namespace recordcodec {
 
 using Json = nlohmann::ordered_json;
 
@@ -88,4 +88,4 @@ std::string pathText(const std::vector<PathStep>& path);
 // Bytes as lower-case hex digits, two per byte.
 std::string hexOf(std::span<const uint8_t> bytes);
 
-} // namespace calibcodec
+} // namespace recordcodec
