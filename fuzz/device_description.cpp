@@ -9,9 +9,9 @@
 #include "support/FuzzSupport.h"
 #include "support/PlainFiles.h"
 
-#include "host/DeviceDescription.h"
-#include "host/DriverSample.h"
-#include "host/Unit.h"
+#include "host/emulator/DeviceDescription.h"
+#include "host/emulator/DriverSample.h"
+#include "host/emulator/Unit.h"
 
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/HIDHost.h>

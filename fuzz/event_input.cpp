@@ -8,9 +8,9 @@
 #include "support/FuzzSupport.h"
 #include "support/PlainFiles.h"
 
-#include "host/DeviceDescription.h"
-#include "host/DriverSample.h"
-#include "host/EventInput.h"
+#include "host/emulator/DeviceDescription.h"
+#include "host/emulator/DriverSample.h"
+#include "host/inputs/EventInput.h"
 
 #include <cstdlib>
 #include <sstream>

@@ -1,6 +1,6 @@
 #include "host/vantish/ClientColour.h"
 
-#include "host/DriverSample.h"
+#include "host/emulator/DriverSample.h"
 
 namespace vantish {
 

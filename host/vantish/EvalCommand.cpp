@@ -2,12 +2,12 @@
 // lights, beside a global least-squares matrix on the same readings.
 #include "host/vantish/EvalCommand.h"
 
-#include "host/AccuracyReport.h"
-#include "host/Evaluation.h"
-#include "host/GlobalMatrixBaseline.h"
-#include "host/ProgressBar.h"
-#include "host/SpectrumFile.h"
-#include "host/UnitSpectra.h"
+#include "host/evaluation/AccuracyReport.h"
+#include "host/evaluation/Evaluation.h"
+#include "host/evaluation/GlobalMatrixBaseline.h"
+#include "host/evaluation/ProgressBar.h"
+#include "host/inputs/SpectrumFile.h"
+#include "host/inputs/UnitSpectra.h"
 #include "host/vantish/OpenedUnit.h"
 #include "host/vantish/ReadingFilter.h"
 #include "spectra/TestLights.h"

@@ -2,11 +2,11 @@
 // calibration bring-up, and report what it read, logged and handed the driver.
 #include "host/vantish/Commands.h"
 
-#include "host/Bundle.h"
-#include "host/DriverSample.h"
-#include "host/DataFolder.h"
-#include "host/PlugInSession.h"
-#include "host/Unit.h"
+#include "host/emulator/Bundle.h"
+#include "host/emulator/DriverSample.h"
+#include "host/emulator/DataFolder.h"
+#include "host/emulator/PlugInSession.h"
+#include "host/emulator/Unit.h"
 
 #include <VantishPlatform/LogControl.h>
 

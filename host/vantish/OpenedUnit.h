@@ -4,9 +4,9 @@
 
 #include "host/vantish/Commands.h"
 
-#include "host/Bundle.h"
-#include "host/PlugInSession.h"
-#include "host/Unit.h"
+#include "host/emulator/Bundle.h"
+#include "host/emulator/PlugInSession.h"
+#include "host/emulator/Unit.h"
 
 #include <memory>
 #include <string>

@@ -1,7 +1,7 @@
 #include "host/vantish/ReadingFilter.h"
 
-#include "host/DriverSample.h"
-#include "host/EventInput.h"
+#include "host/emulator/DriverSample.h"
+#include "host/inputs/EventInput.h"
 
 #include <sstream>
 #include <stdexcept>

@@ -4,7 +4,7 @@
 // into the driver's ALS event and filtered through the loaded bundle.
 #pragma once
 
-#include "host/SyntheticReading.h"
+#include "host/inputs/SyntheticReading.h"
 #include "host/vantish/ClientColour.h"
 #include "host/vantish/OpenedUnit.h"
 

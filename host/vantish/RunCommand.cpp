@@ -4,8 +4,8 @@
 #include "host/vantish/Commands.h"
 #include "host/vantish/OpenedUnit.h"
 
-#include "host/DriverSample.h"
-#include "host/EventInput.h"
+#include "host/emulator/DriverSample.h"
+#include "host/inputs/EventInput.h"
 #include "spectra/Colorimetry.h"
 
 #include <fstream>

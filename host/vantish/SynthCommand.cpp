@@ -3,10 +3,10 @@
 // channel spectra, as CSV that `vantish run` reads.
 #include "host/vantish/Commands.h"
 
-#include "host/DeviceDescription.h"
-#include "host/SpectrumFile.h"
-#include "host/SyntheticReading.h"
-#include "host/UnitSpectra.h"
+#include "host/emulator/DeviceDescription.h"
+#include "host/inputs/SpectrumFile.h"
+#include "host/inputs/SyntheticReading.h"
+#include "host/inputs/UnitSpectra.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/TestLights.h"
 

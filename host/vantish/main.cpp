@@ -2,8 +2,8 @@
 // as the HID event system would.
 #include "host/vantish/Commands.h"
 
-#include "host/Bundle.h"
-#include "host/Unit.h"
+#include "host/emulator/Bundle.h"
+#include "host/emulator/Unit.h"
 
 #include <VantishPlatform/LogControl.h>
 

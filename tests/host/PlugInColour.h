@@ -2,8 +2,8 @@
 // the built bundle with a unit's readings.
 #pragma once
 
-#include "host/DriverSample.h"
-#include "host/PlugInSession.h"
+#include "host/emulator/DriverSample.h"
+#include "host/emulator/PlugInSession.h"
 #include "spectra/Colorimetry.h"
 
 #include <optional>

@@ -1,8 +1,8 @@
 // The accuracy report is one well-formed XHTML file with inline SVG, whatever
 // the names in it, and carries the summary and one table row per light.
 #include "ReportXml.h"
-#include "host/AccuracyReport.h"
-#include "host/ChromaticityDiagram.h"
+#include "host/evaluation/AccuracyReport.h"
+#include "host/evaluation/ChromaticityDiagram.h"
 
 #include <gtest/gtest.h>
 

@@ -1,5 +1,5 @@
 // Loading the plug-in bundle through its registration, as the event system does.
-#include "host/Bundle.h"
+#include "host/emulator/Bundle.h"
 #include "support/TestSupport.h"
 
 #include <gtest/gtest.h>

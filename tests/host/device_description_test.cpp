@@ -3,7 +3,7 @@
 // command used to abort on the null value), arrays holding such an element
 // (the array was leaked) and device-information answers, which the check
 // skipped (the unit's service was leaked when making the unit failed on one).
-#include "host/DeviceDescription.h"
+#include "host/emulator/DeviceDescription.h"
 #include "support/TestSupport.h"
 
 #include <gtest/gtest.h>

@@ -1,6 +1,6 @@
 // Synthetic readings, the global-matrix baseline and the accuracy statistics.
-#include "host/Evaluation.h"
-#include "host/GlobalMatrixBaseline.h"
+#include "host/evaluation/Evaluation.h"
+#include "host/evaluation/GlobalMatrixBaseline.h"
 #include "spectra/Catalogue.h"
 #include "spectra/CieData.h"
 #include "spectra/TestLights.h"

@@ -1,7 +1,7 @@
 // Sample times of `vantish run` input: the event's time stamp is the row's
 // time in nanoseconds, so the reader refuses times the 64-bit clock cannot
 // hold (found by fuzzing: a negative or huge "ts" was converted regardless).
-#include "host/EventInput.h"
+#include "host/inputs/EventInput.h"
 
 #include <gtest/gtest.h>
 

@@ -3,9 +3,9 @@
 // with its own calibration, builds its per-chip database, finds it again on
 // the next start and estimates the colour of light its model sensor sees.
 #include "PlugInColour.h"
-#include "host/Bundle.h"
-#include "host/DeviceDescription.h"
-#include "host/Unit.h"
+#include "host/emulator/Bundle.h"
+#include "host/emulator/DeviceDescription.h"
+#include "host/emulator/Unit.h"
 #include "host/recordcodec/RecordCodec.h"
 #include "spectra/CieIlluminants.h"
 #include "spectra/Colorimetry.h"

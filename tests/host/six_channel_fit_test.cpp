@@ -9,9 +9,9 @@
 // moves the plug-in away from this estimate. Where both are far from the
 // truth (line spectra), the loss belongs to the sensor, not to the path.
 #include "PlugInColour.h"
-#include "host/Bundle.h"
-#include "host/Unit.h"
-#include "host/UnitSpectra.h"
+#include "host/emulator/Bundle.h"
+#include "host/emulator/Unit.h"
+#include "host/inputs/UnitSpectra.h"
 #include "spectra/Catalogue.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"

@@ -1,6 +1,6 @@
 // Light spectra from files: CGATS through lcms2, two-column CSV, other grids
 // resampled, and files that give no spectrum named with the reason.
-#include "host/SpectrumFile.h"
+#include "host/inputs/SpectrumFile.h"
 #include "spectra/CieData.h"
 #include "spectra/CieIlluminants.h"
 #include "spectra/Colorimetry.h"

@@ -6,7 +6,7 @@
 // baseline's estimate in another mark; then the summary and the table.
 #pragma once
 
-#include "host/Evaluation.h"
+#include "host/evaluation/Evaluation.h"
 
 #include <iosfwd>
 #include <string>

@@ -1,4 +1,4 @@
-#include "host/DeviceDescription.h"
+#include "host/emulator/DeviceDescription.h"
 
 #include <cctype>
 #include <fstream>

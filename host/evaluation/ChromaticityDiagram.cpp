@@ -1,6 +1,6 @@
-#include "host/ChromaticityDiagram.h"
+#include "host/evaluation/ChromaticityDiagram.h"
 
-#include "host/XmlEscape.h"
+#include "host/evaluation/XmlEscape.h"
 #include "spectra/CieData.h"
 
 #include <algorithm>

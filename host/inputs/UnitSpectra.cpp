@@ -1,4 +1,4 @@
-#include "host/UnitSpectra.h"
+#include "host/inputs/UnitSpectra.h"
 
 #include "host/recordcodec/RecordCodec.h"
 

@@ -10,7 +10,7 @@
 // Records are decoded with the record codec (host/recordcodec/RecordCodec.h).
 #pragma once
 
-#include "host/DeviceDescription.h"
+#include "host/emulator/DeviceDescription.h"
 #include "spectra/Catalogue.h"
 #include "spectra/Grid.h"
 

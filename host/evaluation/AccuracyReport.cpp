@@ -1,7 +1,7 @@
-#include "host/AccuracyReport.h"
+#include "host/evaluation/AccuracyReport.h"
 
-#include "host/ChromaticityDiagram.h"
-#include "host/XmlEscape.h"
+#include "host/evaluation/ChromaticityDiagram.h"
+#include "host/evaluation/XmlEscape.h"
 
 #include <cstdio>
 #include <ostream>

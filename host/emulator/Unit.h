@@ -4,7 +4,7 @@
 // registry and the store are process-wide).
 #pragma once
 
-#include "host/DeviceDescription.h"
+#include "host/emulator/DeviceDescription.h"
 
 #include <IOKit/hid/IOHIDService.h>
 

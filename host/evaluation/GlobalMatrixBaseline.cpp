@@ -1,4 +1,4 @@
-#include "host/GlobalMatrixBaseline.h"
+#include "host/evaluation/GlobalMatrixBaseline.h"
 
 #include <stdexcept>
 #include <string>

@@ -5,7 +5,7 @@
 // global-matrix baseline's estimate in another mark; a legend.
 #pragma once
 
-#include "host/Evaluation.h"
+#include "host/evaluation/Evaluation.h"
 
 #include <string>
 #include <vector>

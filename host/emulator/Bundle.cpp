@@ -1,4 +1,4 @@
-#include "host/Bundle.h"
+#include "host/emulator/Bundle.h"
 
 #include <nlohmann/json.hpp>
 

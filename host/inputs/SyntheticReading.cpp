@@ -1,4 +1,4 @@
-#include "host/SyntheticReading.h"
+#include "host/inputs/SyntheticReading.h"
 
 #include <algorithm>
 #include <cstdio>

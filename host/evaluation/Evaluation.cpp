@@ -1,4 +1,4 @@
-#include "host/Evaluation.h"
+#include "host/evaluation/Evaluation.h"
 
 #include <algorithm>
 #include <cmath>

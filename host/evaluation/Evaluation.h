@@ -4,7 +4,7 @@
 // the estimate from the same reading and its error Δu′v′ and ΔCCT.
 #pragma once
 
-#include "host/SyntheticReading.h"
+#include "host/inputs/SyntheticReading.h"
 #include "spectra/Colorimetry.h"
 
 #include <functional>

@@ -1,4 +1,4 @@
-#include "host/Unit.h"
+#include "host/emulator/Unit.h"
 
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/HIDHost.h>

@@ -1,4 +1,4 @@
-#include "host/EventInput.h"
+#include "host/inputs/EventInput.h"
 
 #include <algorithm>
 #include <charconv>

@@ -1,4 +1,4 @@
-#include "host/ProgressBar.h"
+#include "host/evaluation/ProgressBar.h"
 
 #include <algorithm>
 #include <cstdio>

@@ -1,4 +1,4 @@
-#include "host/SpectrumFile.h"
+#include "host/inputs/SpectrumFile.h"
 
 #include "spectra/Colorimetry.h"
 #include "spectra/SpectralTable.h"

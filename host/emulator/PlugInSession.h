@@ -2,8 +2,8 @@
 // it: match, open, then events and client properties through the table.
 #pragma once
 
-#include "host/Bundle.h"
-#include "host/Unit.h"
+#include "host/emulator/Bundle.h"
+#include "host/emulator/Unit.h"
 
 namespace host {
 

@@ -2,7 +2,7 @@
 // channel spectra.
 //
 // Channel counts: c_k = s · Σ_λ E(λ)·R_k(λ), with E the light's spectrum and
-// R_k the stored sensitivity of channel k (host/UnitSpectra.h). The scale s
+// R_k the stored sensitivity of channel k (host/inputs/UnitSpectra.h). The scale s
 // puts the counts where the sensor's own lux formula puts them: the
 // calibration's lux coefficients w_k (lux per count) give back the light's
 // illuminance, Σ w_k·c_k = lux. With the sample units' coefficients that is a
@@ -12,7 +12,7 @@
 // channel instead.
 #pragma once
 
-#include "host/UnitSpectra.h"
+#include "host/inputs/UnitSpectra.h"
 
 #include <cstdint>
 #include <iosfwd>

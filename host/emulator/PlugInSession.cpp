@@ -1,4 +1,4 @@
-#include "host/PlugInSession.h"
+#include "host/emulator/PlugInSession.h"
 
 #include <VantishPlatform/DispatchControl.h>
 

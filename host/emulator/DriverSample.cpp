@@ -1,4 +1,4 @@
-#include "host/DriverSample.h"
+#include "host/emulator/DriverSample.h"
 
 #include "support/LittleEndian.h"
 

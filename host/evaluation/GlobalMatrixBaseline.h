@@ -6,7 +6,7 @@
 // its own estimate.
 #pragma once
 
-#include "host/SyntheticReading.h"
+#include "host/inputs/SyntheticReading.h"
 #include "spectra/Colorimetry.h"
 
 #include <array>

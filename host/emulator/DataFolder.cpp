@@ -1,4 +1,4 @@
-#include "host/DataFolder.h"
+#include "host/emulator/DataFolder.h"
 
 #include <cstdlib>
 
