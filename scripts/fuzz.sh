@@ -29,7 +29,7 @@ CC=clang CXX=clang++ VANTISH_BUILD_DIR=$build VANTISH_BUILD_TYPE=RelWithDebInfo 
 # Seeds: the in-tree corpus (hand-made inputs and every past finding), seeds
 # generated from the record layouts, and the sample devices of data/.
 rm -rf "$build/seeds"
-"$build/fuzz/fuzz_make_seeds" "$build/seeds" "$here/data"
+"$build/tools/fuzz_make_seeds" "$build/seeds" "$here/data"
 mkdir -p "$build/artifacts"
 
 # Findings stop the process at once; leak checks run per input.
