@@ -1,5 +1,7 @@
 #include "host/emulator/Bundle.h"
 
+#include "support/CFOwned.h"
+
 #include <nlohmann/json.hpp>
 
 #include <dlfcn.h>
@@ -19,20 +21,19 @@ namespace {
 const char* kTypeKey = "CFPlugInTypes";
 const char* kFactoriesKey = "CFPlugInFactories";
 
-CFUUIDRef parseUUID(const std::string& text)
+// Null when the text is not a UUID; text that is not ASCII is not one either.
+CFOwned<CFUUIDRef> parseUUID(const std::string& text)
 {
-    CFStringRef string = CFStringCreateWithCString(nullptr, text.c_str(), kCFStringEncodingASCII);
-    CFUUIDRef uuid = CFUUIDCreateFromString(nullptr, string);
-    CFRelease(string);
-    return uuid;
+    const CFOwned<CFStringRef> string(CFStringCreateWithCString(nullptr, text.c_str(), kCFStringEncodingASCII));
+    if (!string)
+        return {};
+    return CFOwned<CFUUIDRef>(CFUUIDCreateFromString(nullptr, string.get()));
 }
 
 std::string uuidString(CFUUIDRef uuid)
 {
-    CFStringRef string = CFUUIDCreateString(nullptr, uuid);
-    std::string text = CFStringGetCStringPtr(string, kCFStringEncodingASCII);
-    CFRelease(string);
-    return text;
+    const CFOwned<CFStringRef> string(CFUUIDCreateString(nullptr, uuid));
+    return CFStringGetCStringPtr(string.get(), kCFStringEncodingASCII);
 }
 
 // The factory function name registered for the service-filter type.
@@ -42,24 +43,16 @@ std::string findFactory(const nlohmann::json& info, const fs::path& infoPath)
     if (!info.contains(kTypeKey) || !info.contains(kFactoriesKey))
         throw std::runtime_error(infoPath.string() + ": no " + kTypeKey + " or " + kFactoriesKey);
     for (const auto& [type, factories] : info[kTypeKey].items()) {
-        CFUUIDRef typeID = parseUUID(type);
-        const bool isFilterType = typeID && CFEqual(typeID, kIOHIDServiceFilterPlugInTypeID);
-        if (typeID)
-            CFRelease(typeID);
-        if (!isFilterType || !factories.is_array())
+        const CFOwned<CFUUIDRef> typeID = parseUUID(type);
+        if (!typeID || !CFEqual(typeID.get(), kIOHIDServiceFilterPlugInTypeID) || !factories.is_array())
             continue;
         for (const auto& factory : factories) {
             if (!factory.is_string())
                 continue;
             for (const auto& [id, name] : info[kFactoriesKey].items()) {
-                CFUUIDRef a = parseUUID(id);
-                CFUUIDRef b = parseUUID(factory.get<std::string>());
-                const bool same = a && b && CFEqual(a, b);
-                if (a)
-                    CFRelease(a);
-                if (b)
-                    CFRelease(b);
-                if (same && name.is_string())
+                const CFOwned<CFUUIDRef> a = parseUUID(id);
+                const CFOwned<CFUUIDRef> b = parseUUID(factory.get<std::string>());
+                if (a && b && CFEqual(a.get(), b.get()) && name.is_string())
                     return name.get<std::string>();
             }
         }

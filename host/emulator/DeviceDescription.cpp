@@ -1,5 +1,7 @@
 #include "host/emulator/DeviceDescription.h"
 
+#include "support/CFOwned.h"
+
 #include <cctype>
 #include <fstream>
 #include <iterator>
@@ -77,18 +79,13 @@ CFTypeRef createPropertyValue(const nlohmann::json& value, const fs::path& folde
         return CFNumberCreate(nullptr, kCFNumberFloat64Type, &v);
     }
     case nlohmann::json::value_t::array: {
-        CFMutableArrayRef array = CFArrayCreateMutable(nullptr, CFIndex(value.size()), &kCFTypeArrayCallBacks);
-        try {
-            for (size_t i = 0; i < value.size(); ++i) {
-                CFTypeRef element = createPropertyValue(value[i], folder, where + "[" + std::to_string(i) + "]");
-                CFArrayAppendValue(array, element);
-                CFRelease(element);
-            }
-        } catch (...) {
-            CFRelease(array); // an element that has no CF form ends the whole value
-            throw;
+        // An element that has no CF form ends the whole value (and releases what was made of it).
+        CFOwned<CFMutableArrayRef> array(CFArrayCreateMutable(nullptr, CFIndex(value.size()), &kCFTypeArrayCallBacks));
+        for (size_t i = 0; i < value.size(); ++i) {
+            const CFOwned<CFTypeRef> element(createPropertyValue(value[i], folder, where + "[" + std::to_string(i) + "]"));
+            CFArrayAppendValue(array.get(), element.get());
         }
-        return array;
+        return array.release();
     }
     case nlohmann::json::value_t::object:
         if (value.size() == 1 && value.contains("data") && value["data"].is_string())

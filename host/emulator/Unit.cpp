@@ -1,5 +1,7 @@
 #include "host/emulator/Unit.h"
 
+#include "support/CFOwned.h"
+
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/HIDHost.h>
 #include <VantishPlatform/Paths.h>
@@ -20,11 +22,9 @@ void setProperties(const nlohmann::json& properties, const fs::path& folder, con
                    const std::function<void(CFStringRef, CFTypeRef)>& set)
 {
     for (const auto& [key, value] : properties.items()) {
-        CFTypeRef cfValue = createPropertyValue(value, folder, where + "." + key); // may throw
-        CFStringRef cfKey = CFStringCreateWithCString(nullptr, key.c_str(), kCFStringEncodingUTF8);
-        set(cfKey, cfValue);
-        CFRelease(cfValue);
-        CFRelease(cfKey);
+        const CFOwned<CFTypeRef> cfValue(createPropertyValue(value, folder, where + "." + key)); // may throw
+        const CFOwned<CFStringRef> cfKey(CFStringCreateWithCString(nullptr, key.c_str(), kCFStringEncodingUTF8));
+        set(cfKey.get(), cfValue.get());
     }
 }
 
@@ -66,11 +66,11 @@ Unit::Unit(const DeviceDescription& description) : description_(description)
 {
     createRegistry(description_);
 
-    service_ = VPServiceCreate(description_.registryID);
+    service_.reset(VPServiceCreate(description_.registryID));
     for (const auto& [page, usage] : description_.usages)
-        VPServiceAddUsage(service_, page, usage);
+        VPServiceAddUsage(service_.get(), page, usage);
     setProperties(description_.serviceProperties, description_.folder(), "service.properties",
-                  [&](CFStringRef k, CFTypeRef v) { VPServicePublishProperty(service_, k, v); });
+                  [&](CFStringRef k, CFTypeRef v) { VPServicePublishProperty(service_.get(), k, v); });
 
     VPQVTSetStoreDirectory(description_.factoryStore ? description_.factoryStore->string() : std::string());
     VPSetBootArgs(description_.bootArgs);
@@ -80,18 +80,10 @@ Unit::Unit(const DeviceDescription& description) : description_(description)
                   [](CFStringRef k, CFTypeRef v) { VPTessarySetAnswer(k, v); });
 }
 
-Unit::~Unit()
-{
-    if (service_)
-        CFRelease(service_);
-}
-
 CFTypeRef Unit::copyDriverProperty(const char* key) const
 {
-    CFStringRef cfKey = CFStringCreateWithCString(nullptr, key, kCFStringEncodingUTF8);
-    CFTypeRef value = VPServiceCopyReceivedProperty(service_, cfKey);
-    CFRelease(cfKey);
-    return value;
+    const CFOwned<CFStringRef> cfKey(CFStringCreateWithCString(nullptr, key, kCFStringEncodingUTF8));
+    return VPServiceCopyReceivedProperty(service_.get(), cfKey.get());
 }
 
 void mapDevicePaths(const std::string& bundleFolder, const std::string& stateFolder)

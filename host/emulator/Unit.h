@@ -5,6 +5,7 @@
 #pragma once
 
 #include "host/emulator/DeviceDescription.h"
+#include "support/CFOwned.h"
 
 #include <IOKit/hid/IOHIDService.h>
 
@@ -15,19 +16,18 @@ namespace host {
 class Unit {
 public:
     explicit Unit(const DeviceDescription& description);
-    ~Unit();
     Unit(const Unit&) = delete;
     Unit& operator=(const Unit&) = delete;
 
     const DeviceDescription& description() const { return description_; }
-    IOHIDServiceRef service() const { return service_; }
+    IOHIDServiceRef service() const { return service_.get(); }
 
     // What the plug-in handed the driver under `key` (retained), or null.
     CFTypeRef copyDriverProperty(const char* key) const;
 
 private:
     DeviceDescription description_;
-    IOHIDServiceRef service_ = nullptr;
+    CFOwned<IOHIDServiceRef> service_; // released too when the constructor fails after making it
 };
 
 // Maps the device's fixed paths: the system folder onto the bundle's parent,

@@ -1,6 +1,7 @@
 #include "host/inputs/UnitSpectra.h"
 
 #include "host/recordcodec/RecordCodec.h"
+#include "support/CFOwned.h"
 
 #include <CoreFoundation/CoreFoundation.h>
 
@@ -265,15 +266,12 @@ std::optional<std::vector<uint8_t>> registryData(const DeviceDescription& unit, 
     const nlohmann::json* value = registryProperty(unit, key, where);
     if (!value)
         return std::nullopt;
-    CFTypeRef cf = createPropertyValue(*value, unit.folder(), unit.file.string() + ": " + where);
-    std::optional<std::vector<uint8_t>> bytes;
-    if (CFGetTypeID(cf) == CFDataGetTypeID()) {
-        const CFDataRef data = static_cast<CFDataRef>(cf);
-        const uint8_t* begin = CFDataGetBytePtr(data);
-        bytes.emplace(begin, begin + CFDataGetLength(data));
-    }
-    CFRelease(cf);
-    return bytes;
+    const CFOwned<CFTypeRef> cf(createPropertyValue(*value, unit.folder(), unit.file.string() + ": " + where));
+    if (CFGetTypeID(cf.get()) != CFDataGetTypeID())
+        return std::nullopt;
+    const CFDataRef data = static_cast<CFDataRef>(cf.get());
+    const uint8_t* begin = CFDataGetBytePtr(data);
+    return std::vector<uint8_t>(begin, begin + CFDataGetLength(data));
 }
 
 uint32_t orientationOf(const DeviceDescription& unit)

@@ -7,6 +7,7 @@
 #include "host/emulator/DataFolder.h"
 #include "host/emulator/PlugInSession.h"
 #include "host/emulator/Unit.h"
+#include "support/CFOwned.h"
 
 #include <VantishPlatform/LogControl.h>
 
@@ -47,19 +48,17 @@ void printLog(const std::vector<VPLogLine>& lines)
 
 void printDriverProperty(const host::Unit& unit, const char* key)
 {
-    CFTypeRef value = unit.copyDriverProperty(key);
+    const CFOwned<CFTypeRef> value(unit.copyDriverProperty(key));
     if (!value) {
         std::cout << "    " << key << ": not set\n";
         return;
     }
-    if (CFGetTypeID(value) == CFDataGetTypeID()) {
-        std::cout << "    " << key << ": " << CFDataGetLength(static_cast<CFDataRef>(value)) << " bytes\n";
+    if (CFGetTypeID(value.get()) == CFDataGetTypeID()) {
+        std::cout << "    " << key << ": " << CFDataGetLength(static_cast<CFDataRef>(value.get())) << " bytes\n";
     } else {
-        CFStringRef description = CFCopyDescription(value);
-        std::cout << "    " << key << ": " << CFStringGetCStringPtr(description, kCFStringEncodingUTF8) << "\n";
-        CFRelease(description);
+        const CFOwned<CFStringRef> description(CFCopyDescription(value.get()));
+        std::cout << "    " << key << ": " << CFStringGetCStringPtr(description.get(), kCFStringEncodingUTF8) << "\n";
     }
-    CFRelease(value);
 }
 
 int runOpen(const CommonOptions& common, const OpenOptions& options)
@@ -108,10 +107,9 @@ int runOpen(const CommonOptions& common, const OpenOptions& options)
         probe.sampleOrientation = 1;
         probe.lux = probe.rawLux = 100.0f;
         probe.channelValues.fill(1000.0f);
-        IOHIDEventRef event = host::createALSEvent(probe, 0);
-        session.filter(event);
-        const bool colour = IOHIDEventGetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace) != 0;
-        CFRelease(event);
+        const CFOwned<IOHIDEventRef> event(host::createALSEvent(probe, 0));
+        session.filter(event.get());
+        const bool colour = IOHIDEventGetIntegerValue(event.get(), kIOHIDEventFieldAmbientLightColorSpace) != 0;
         VPLogTakeCaptured();
         std::cout << "colour  " << (colour ? "on: the per-chip database is ready (dbReady)"
                                            : "off: no per-chip database (dbReady is 0)")

@@ -2,6 +2,7 @@
 
 #include "host/emulator/DriverSample.h"
 #include "host/inputs/EventInput.h"
+#include "support/CFOwned.h"
 
 #include <sstream>
 #include <stdexcept>
@@ -20,11 +21,9 @@ ClientColour filterReading(OpenedUnit& opened, const host::SensorReading& readin
         throw std::logic_error("a synthetic reading did not read back: " +
                                (errors.empty() ? std::string("no row") : errors.front().describe("reading")));
 
-    IOHIDEventRef event = host::createALSEvent(row->record, uint64_t(row->timeSeconds * 1e9));
-    opened.session->filter(event);
-    ClientColour colour = readClientColour(event, row->record);
-    CFRelease(event);
-    return colour;
+    const CFOwned<IOHIDEventRef> event(host::createALSEvent(row->record, uint64_t(row->timeSeconds * 1e9)));
+    opened.session->filter(event.get());
+    return readClientColour(event.get(), row->record);
 }
 
 } // namespace vantish

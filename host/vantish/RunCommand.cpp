@@ -7,6 +7,7 @@
 #include "host/emulator/DriverSample.h"
 #include "host/inputs/EventInput.h"
 #include "spectra/Colorimetry.h"
+#include "support/CFOwned.h"
 
 #include <fstream>
 #include <iomanip>
@@ -74,17 +75,14 @@ private:
 bool setProperty(OpenedUnit& opened, const std::string& key, const nlohmann::json& value, std::string& error)
 {
     try {
-        CFTypeRef cfValue = clientPropertyValue(value);
-        CFStringRef cfKey = CFStringCreateWithCString(nullptr, key.c_str(), kCFStringEncodingUTF8);
+        const CFOwned<CFTypeRef> cfValue(clientPropertyValue(value));
+        const CFOwned<CFStringRef> cfKey(CFStringCreateWithCString(nullptr, key.c_str(), kCFStringEncodingUTF8));
         // A property key is a CF string: text that is not UTF-8 cannot be one.
         if (!cfKey) {
-            CFRelease(cfValue);
             error = "the key is not UTF-8 text";
             return false;
         }
-        opened.session->setProperty(cfKey, cfValue);
-        CFRelease(cfKey);
-        CFRelease(cfValue);
+        opened.session->setProperty(cfKey.get(), cfValue.get());
         return true;
     } catch (const std::exception& e) {
         error = e.what();
@@ -136,7 +134,7 @@ int runEvents(const CommonOptions& common, const RunOptions& options)
     host::EventReader reader(*in, format, opened->channelCount());
     std::vector<host::InputError> errors;
     size_t samples = 0, failed = 0, rows = 0;
-    IOHIDEventRef lastDriverEvent = nullptr; // the service's current event, for copies
+    CFOwned<IOHIDEventRef> lastDriverEvent; // the service's current event, for copies
     ALSSampleRecord lastRecord;
     auto reportErrors = [&] {
         for (const auto& e : errors)
@@ -160,34 +158,28 @@ int runEvents(const CommonOptions& common, const RunOptions& options)
                 errors.push_back({row->line, "", "nothing to copy before the first sample"});
                 break;
             }
-            IOHIDEventRef copy = IOHIDEventCreateCopy(kCFAllocatorDefault, lastDriverEvent);
-            opened->session->copyEvent(copy);
-            ClientColour r = readClientColour(copy, lastRecord);
+            const CFOwned<IOHIDEventRef> copy(IOHIDEventCreateCopy(kCFAllocatorDefault, lastDriverEvent.get()));
+            opened->session->copyEvent(copy.get());
+            ClientColour r = readClientColour(copy.get(), lastRecord);
             r.index = "copy";
             printer.print(r);
-            CFRelease(copy);
             break;
         }
         case host::InputRow::Kind::Sample: {
             const uint64_t ticks = uint64_t(row->timeSeconds * 1e9);
-            IOHIDEventRef event = host::createALSEvent(row->record, ticks);
-            if (lastDriverEvent)
-                CFRelease(lastDriverEvent);
-            lastDriverEvent = IOHIDEventCreateCopy(kCFAllocatorDefault, event);
+            const CFOwned<IOHIDEventRef> event(host::createALSEvent(row->record, ticks));
+            lastDriverEvent.reset(IOHIDEventCreateCopy(kCFAllocatorDefault, event.get()));
             lastRecord = row->record;
-            opened->session->filter(event);
-            ClientColour r = readClientColour(event, row->record);
+            opened->session->filter(event.get());
+            ClientColour r = readClientColour(event.get(), row->record);
             r.index = std::to_string(samples++);
             printer.print(r);
-            CFRelease(event);
             break;
         }
         }
         reportErrors();
     }
     reportErrors();
-    if (lastDriverEvent)
-        CFRelease(lastDriverEvent);
     std::cout.flush();
     if (rows == 0 && failed == 0) {
         std::cerr << "vantish: " << source << ": no samples (the input is empty or only a header)\n";

@@ -44,6 +44,13 @@ TEST(Bundle, RejectsBrokenRegistrations)
         EXPECT_NE(std::string(e.what()).find("service-filter"), std::string::npos) << e.what();
     }
 
+    // Keys that cannot be UUIDs at all (not ASCII) are passed over like any other.
+    write(dir.path() / "Info.json", R"({"CFBundleExecutable": "Vantish.so",
+        "CFPlugInFactories": {"\u00e9": "VantishPlugInFactory"},
+        "CFPlugInTypes": {"\u00e9": ["D1148FE3-60F3-4B3B-8505-E28C1E66EBC8"],
+                          "6B0340D3-5798-4064-AA17-9204C7B06FFD": ["\u00e9"]}})");
+    EXPECT_THROW(host::Bundle(dir.str()), std::runtime_error);
+
     write(dir.path() / "Info.json", R"({"CFBundleExecutable": "missing.so",
         "CFPlugInFactories": {"D1148FE3-60F3-4B3B-8505-E28C1E66EBC8": "VantishPlugInFactory"},
         "CFPlugInTypes": {"6B0340D3-5798-4064-AA17-9204C7B06FFD": ["d1148fe3-60f3-4b3b-8505-e28c1e66ebc8"]}})");

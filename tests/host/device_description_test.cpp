@@ -3,7 +3,10 @@
 // command used to abort on the null value), arrays holding such an element
 // (the array was leaked) and device-information answers, which the check
 // skipped (the unit's service was leaked when making the unit failed on one).
+// A value can still fail when the unit is made, after the check: its data
+// file may be gone by then.
 #include "host/emulator/DeviceDescription.h"
+#include "host/emulator/Unit.h"
 #include "support/TestSupport.h"
 
 #include <gtest/gtest.h>
@@ -76,6 +79,17 @@ TEST(DeviceDescription, ValuesWithoutACFFormAreRefusedWhole)
                            json::parse("[{\"data\": \"0g\"}]")};
     for (size_t i = 0; i < std::size(values); ++i)
         EXPECT_THROW(host::createPropertyValue(values[i], ".", "value"), host::DescriptionError) << i;
+}
+
+TEST(DeviceDescription, ADataFileGoneBeforeTheUnitIsMadeIsReported)
+{
+    // Under the address sanitizer a leaked service fails the test program.
+    vt::TempDir dir;
+    std::ofstream(dir.path() / "blob.bin", std::ios::binary) << std::string("\x01\x02", 2);
+    const host::DeviceDescription d = host::parseDeviceDescription(
+        {{"service", {{"properties", {{"x", {{"dataFile", "blob.bin"}}}}}}}}, dir.path() / "unit.json");
+    std::filesystem::remove(dir.path() / "blob.bin");
+    EXPECT_THROW(host::Unit{d}, host::DescriptionError);
 }
 
 } // namespace
