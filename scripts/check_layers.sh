@@ -23,8 +23,8 @@ declare -A allowed=(
     [spectra]=""
     [host/recordcodec]="formats support platform"
     [host/emulator]="formats support platform"
-    [host/inputs]="host/emulator spectra formats support platform"
-    [host/evaluation]="host/inputs host/emulator spectra formats support platform"
+    [host/inputs]="host/recordcodec host/emulator spectra formats support platform"
+    [host/evaluation]="host/inputs host/recordcodec host/emulator spectra formats support platform"
     [host/vantish]="host/evaluation host/inputs host/emulator host/recordcodec lightdb spectra formats support platform"
 )
 order=(platform support formats lightdb colour calibration sysconfig plugin spectra
