@@ -8,11 +8,23 @@
 //     [ I       S R_h^T                 ] [Y]   [ S T_h^T       ]
 //     [ R_h S  -(R_l W_l R_l^T + l I)   ] [H] = [ -R_l W_l T_l^T ]
 // and eliminating Y gives (R W R^T + l I) H = R W T^T over all samples.
+//
+// With a positive, finite lambda and finite weights the dispatcher solves the
+// same least-squares problem in time linear in N instead (stackedSolve): the
+// light samples enter through a Cholesky factor U of G_l + l I, and the heavy
+// samples are then folded into that triangle by Householder reflections as
+// rows sqrt(w) r^T, so their weights enter only through their square roots, as
+// in the augmented system. The triangle and the reflections are kept in double
+// precision, in which the order of the heavy rows does not matter at
+// single-precision accuracy.
+// Everything else (a negative or non-finite lambda, a non-finite weight, a
+// factor that breaks down) takes the augmented system.
 #include "colour/SolverSupport.h"
 
 #include <Accelerate/Accelerate.h>
 
 #include <algorithm>
+#include <cmath>
 #include <cstring>
 #include <utility>
 
@@ -150,6 +162,138 @@ void augmentedSolve(int N, int M, const float* T, const float* w, const float* R
             H[4 * j + c] = b[size_t(c) * n + K + j];
 }
 
+
+// The regularised least-squares problem as an upper triangle U (M x M) with
+// the right-hand side Z (M x 3), min |U H - Z|: the light samples and lambda
+// through the Cholesky factor of G_l + lambda I, then the heavy samples as rows
+// sqrt(w) (r^T | t^T) folded in by one Householder reflection per column. A
+// reflection touches only its own row of U and the heavy rows (U's rows below
+// stay zero in that column), so the cost is linear in the heavy samples. False,
+// H untouched, when the problem is not one this path takes.
+bool stackedSolve(int N, int M, const float* T, const float* w, const float* R, float* H, float lambda)
+{
+    if (!(lambda > 0.0f) || !std::isfinite(lambda))
+        return false;
+    const int columns = M + 3; // the channels, then X, Y and Z
+    auto lightWeights = allocateArray<float>(size_t(std::max(N, 1)));
+    if (!lightWeights)
+        return false;
+    int K = 0;
+    for (int i = 0; i < N; ++i) {
+        if (!std::isfinite(w[i]))
+            return false;
+        const bool heavy = isHeavy(w[i]);
+        lightWeights[i] = heavy ? 0.0f : w[i];
+        K += heavy ? 1 : 0;
+    }
+    auto heavyRows = allocateArray<double>(size_t(std::max(K, 1)) * size_t(columns));
+    if (!heavyRows)
+        return false;
+
+    // G_l + lambda I = U^T U and U^T Z = C_l.
+    PackedScratch gram;
+    float cross[4 * kSolverMaxChannels];
+    weightedGramPacked(N, M, R, N, lightWeights.get(), gram);
+    weightedCrossProduct(N, M, T, N, lightWeights.get(), R, N, cross);
+    double U[kSolverMaxChannels][kSolverMaxChannels + 3] = {};
+    for (int a = 0; a < M; ++a) {
+        for (int b = a; b < M; ++b)
+            U[a][b] = gram[packedIndex(M, a, b)];
+        U[a][a] += double(lambda);
+    }
+    for (int a = 0; a < M; ++a) {
+        double pivot = U[a][a];
+        for (int k = 0; k < a; ++k)
+            pivot -= U[k][a] * U[k][a];
+        if (!(pivot > 0.0) || !std::isfinite(pivot))
+            return false;
+        U[a][a] = std::sqrt(pivot);
+        for (int b = a + 1; b < M; ++b) {
+            double value = U[a][b];
+            for (int k = 0; k < a; ++k)
+                value -= U[k][a] * U[k][b];
+            U[a][b] = value / U[a][a];
+        }
+        for (int c = 0; c < 3; ++c) {
+            double value = cross[4 * a + c];
+            for (int k = 0; k < a; ++k)
+                value -= U[k][a] * U[k][M + c];
+            U[a][M + c] = value / U[a][a];
+        }
+    }
+
+    // The heavy rows, row-major.
+    double* rows = heavyRows.get();
+    for (int i = 0, h = 0; i < N; ++i) {
+        if (!isHeavy(w[i]))
+            continue;
+        const double s = std::sqrt(double(w[i]));
+        double* row = rows + size_t(h++) * columns;
+        for (int j = 0; j < M; ++j)
+            row[j] = s * double(R[size_t(j) * N + i]);
+        for (int c = 0; c < 3; ++c)
+            row[M + c] = s * double(T[size_t(c) * N + i]);
+    }
+
+    // One reflection per column k, acting on row k of U and the heavy rows.
+    for (int k = 0; k < M; ++k) {
+        double lanes[4] = {};
+        int h = 0;
+        for (; h + 3 < K; h += 4)
+            for (int l = 0; l < 4; ++l)
+                lanes[l] += rows[size_t(h + l) * columns + k] * rows[size_t(h + l) * columns + k];
+        for (; h < K; ++h)
+            lanes[0] += rows[size_t(h) * columns + k] * rows[size_t(h) * columns + k];
+        const double sigma = (lanes[0] + lanes[1]) + (lanes[2] + lanes[3]);
+        if (sigma == 0.0)
+            continue;
+        const double alpha = U[k][k];
+        const double norm = std::sqrt(alpha * alpha + sigma);
+        const double beta = alpha <= 0.0 ? norm : -norm;
+        const double tau = (beta - alpha) / beta;
+        const double scale = 1.0 / (alpha - beta); // v = (1, heavy column k * scale)
+
+        double dot[kSolverMaxChannels + 3];
+        for (int j = k + 1; j < columns; ++j)
+            dot[j] = U[k][j];
+        for (h = 0; h < K; ++h) {
+            const double* row = rows + size_t(h) * columns;
+            const double v = row[k] * scale;
+            for (int j = k + 1; j < columns; ++j)
+                dot[j] += v * row[j];
+        }
+        for (int j = k + 1; j < columns; ++j) {
+            dot[j] *= tau;
+            U[k][j] -= dot[j];
+        }
+        for (h = 0; h < K; ++h) {
+            double* row = rows + size_t(h) * columns;
+            const double v = row[k] * scale;
+            for (int j = k + 1; j < columns; ++j)
+                row[j] -= v * dot[j];
+            row[k] = 0.0;
+        }
+        U[k][k] = beta;
+    }
+
+    // U H = Z.
+    double X[kSolverMaxChannels][3];
+    for (int a = M - 1; a >= 0; --a) {
+        for (int c = 0; c < 3; ++c) {
+            double value = U[a][M + c];
+            for (int b = a + 1; b < M; ++b)
+                value -= U[a][b] * X[b][c];
+            X[a][c] = value / U[a][a];
+            if (!std::isfinite(X[a][c]))
+                return false;
+        }
+    }
+    for (int a = 0; a < M; ++a)
+        for (int c = 0; c < 3; ++c)
+            H[4 * a + c] = float(X[a][c]);
+    return true;
+}
+
 } // namespace
 
 extern "C" void hybridSolveWithRegularization(int N, int M, const float* T, const float* w, const float* R, float* H,
@@ -169,6 +313,8 @@ extern "C" void hybridSolveWithRegularization(int N, int M, const float* T, cons
         specialSolveWithRegularization(N, M, T, w, R, H, lambda);
         return;
     }
+    if (stackedSolve(N, M, T, w, R, H, lambda))
+        return;
     augmentedSolve(N, M, T, w, R, H, lambda);
 }
 
