@@ -2,13 +2,24 @@
 // sensors have, in its three modes:
 //   raw         lambda 0, raw similarity weights (unregularised fit)
 //   normalised  lambda 0.01 with a normalised database (regularised normal equations)
-//   client      lambda 0.01 set by a client without normalisation (augmented system)
+//   client      lambda 0.01 set by a client without normalisation (heavy samples)
 // Beside each, a plain double-precision version of the same fit (weights,
-// normal equations, LU solve) as the baseline.
+// normal equations, LU solve) as the baseline. Each iteration fits the next of
+// 64 measurements, so nothing a call computes can be reused by the next one.
+//
+// The synthetic databases have random responses; the "unit" cases use the
+// per-chip database of the sample unit xwca-t2 (425 sources, 5 channels), as
+// `vantish open` caches it (the build writes it beside the benchmark; another
+// cache file can be named with VANTISH_BENCH_CACHE).
 //
 // Run: bench_colour --benchmark_repetitions=9 --benchmark_report_aggregates_only=true
 #include "colour/ColourCalculation.h"
 #include "colour/MatrixUtilities.h"
+#include "colour/SimdLevel.h"
+#include "lightdb/Inspect.h"
+#include "lightdb/LDBM.h"
+
+#include <VantishPlatform/Paths.h>
 
 #include <benchmark/benchmark.h>
 
@@ -16,7 +27,10 @@
 #include <atomic>
 #include <cmath>
 #include <cstdlib>
+#include <filesystem>
 #include <random>
+#include <stdexcept>
+#include <string>
 #include <vector>
 
 // Heap calls of the process, so each benchmark can show how many one event makes.
@@ -48,6 +62,27 @@ void dgesv_(const int* n, const int* nrhs, double* a, const int* lda, int* ipiv,
 namespace {
 
 enum Mode { Raw, Normalised, ClientLambda };
+
+constexpr int kMeasurements = 64;
+
+// The per-chip database of a cache file as the plug-in loads it.
+SpectralDatabase loadUnitDatabase()
+{
+    const char* named = std::getenv("VANTISH_BENCH_CACHE");
+    const std::filesystem::path file = named ? named : VANTISH_BENCH_UNIT_CACHE;
+    LDBMFileSummary summary;
+    if (LDBMInspect(file.string(), summary) != 0 || summary.kind != LDBMFileSummary::Kind::Cache)
+        throw std::runtime_error("no per-chip cache at " + file.string());
+    // The cache file for orientation 1 is found under the state root.
+    VPSetPathRoot("/var/mobile", file.parent_path().parent_path().parent_path().string());
+    SpectralDatabase db;
+    db.allocate(uint32_t(summary.info.sources), uint32_t(summary.columns.size()));
+    if (LDBMParseSmallDB(1, &summary.info, db.dbXYZ.data(), db.dbChannelResponses.data(), int(db.dbChannelCount)) !=
+        LDBMResult::Ok)
+        throw std::runtime_error("cannot read " + file.string());
+    db.dbInfo = summary.info;
+    return db;
+}
 
 SpectralDatabase makeDatabase(int N, int M)
 {
@@ -89,17 +124,25 @@ void normalise(SpectralDatabase& db)
 struct Setup {
     FitSettings fit;
     SpectralDatabase db;
-    std::vector<float> measured;
+    std::vector<std::vector<float>> measured; // kMeasurements of them
 
-    Setup(Mode mode, int N, int M)
-        : db(makeDatabase(N, M))
+    // N = 0: the sample unit's database.
+    Setup(Mode mode, int N, int M) : db(N > 0 ? makeDatabase(N, M) : loadUnitDatabase())
     {
         fit.lambda = mode == Raw ? 0.0f : 0.01f;
         fit.normalised = mode == Normalised;
         if (mode == Normalised)
             normalise(db);
-        for (int j = 0; j < M; ++j)
-            measured.push_back(0.3f + 0.1f * float((j * 7) % 5));
+        // Measurements near the database's own samples, each a little different.
+        std::mt19937 rng(7);
+        std::uniform_real_distribution<float> spread(0.9f, 1.1f);
+        const int n = int(db.dbSampleCount), m = int(db.dbChannelCount);
+        for (int k = 0; k < kMeasurements; ++k) {
+            std::vector<float> x(static_cast<size_t>(m));
+            for (int j = 0; j < m; ++j)
+                x[size_t(j)] = std::max(db.dbChannelResponses[size_t(j) * n + size_t(k * 13 % n)], 0.01f) * spread(rng);
+            measured.push_back(x);
+        }
     }
 };
 
@@ -172,16 +215,19 @@ void reportHeapCalls(benchmark::State& state, long before)
 void BM_Colour(benchmark::State& state, Mode mode)
 {
     Setup setup(mode, int(state.range(0)), int(state.range(1)));
-    const int M = int(state.range(1));
+    const int M = int(setup.db.dbChannelCount);
     std::vector<float> x(M);
     float xyz[3];
     long before = heapCalls.load();
+    size_t k = 0;
     for (auto _ : state) {
-        std::copy(setup.measured.begin(), setup.measured.end(), x.begin());
+        const std::vector<float>& measured = setup.measured[k++ % kMeasurements];
+        std::copy(measured.begin(), measured.end(), x.begin());
         colourCalculationDynamic(setup.db, setup.fit, x.data(), xyz, M);
         benchmark::DoNotOptimize(xyz);
     }
     reportHeapCalls(state, before);
+    state.SetLabel(simdLevelName(activeSimdLevel()));
 }
 
 void BM_Baseline(benchmark::State& state, Mode mode)
@@ -192,8 +238,10 @@ void BM_Baseline(benchmark::State& state, Mode mode)
     double exponent = setup.fit.weightExponent;
     double offset = setup.fit.weightOffset;
     long before = heapCalls.load();
+    size_t k = 0;
     for (auto _ : state) {
-        baselineColour(setup.db, setup.measured.data(), xyz, mode == Normalised, lambda, exponent, offset);
+        const std::vector<float>& measured = setup.measured[k++ % kMeasurements];
+        baselineColour(setup.db, measured.data(), xyz, mode == Normalised, lambda, exponent, offset);
         benchmark::DoNotOptimize(xyz);
     }
     reportHeapCalls(state, before);
@@ -207,12 +255,21 @@ void sizes(benchmark::internal::Benchmark* b)
             b->Args({N, M});
 }
 
+// The sample unit's database (N = 0 selects it).
+void unit(benchmark::internal::Benchmark* b) { b->ArgNames({"unit", "M"})->Args({0, 5}); }
+
 BENCHMARK_CAPTURE(BM_Colour, raw, Raw)->Apply(sizes);
 BENCHMARK_CAPTURE(BM_Baseline, raw, Raw)->Apply(sizes);
 BENCHMARK_CAPTURE(BM_Colour, normalised, Normalised)->Apply(sizes);
 BENCHMARK_CAPTURE(BM_Baseline, normalised, Normalised)->Apply(sizes);
 BENCHMARK_CAPTURE(BM_Colour, client, ClientLambda)->Apply(sizes);
 BENCHMARK_CAPTURE(BM_Baseline, client, ClientLambda)->Apply(sizes);
+BENCHMARK_CAPTURE(BM_Colour, raw, Raw)->Apply(unit);
+BENCHMARK_CAPTURE(BM_Baseline, raw, Raw)->Apply(unit);
+BENCHMARK_CAPTURE(BM_Colour, normalised, Normalised)->Apply(unit);
+BENCHMARK_CAPTURE(BM_Baseline, normalised, Normalised)->Apply(unit);
+BENCHMARK_CAPTURE(BM_Colour, client, ClientLambda)->Apply(unit);
+BENCHMARK_CAPTURE(BM_Baseline, client, ClientLambda)->Apply(unit);
 
 } // namespace
 

@@ -6,6 +6,7 @@
 #include "colour/ColourCalculation.h"
 
 #include "colour/MatrixUtilities.h"
+#include "colour/SimdTargets.h"
 #include "colour/SolverSupport.h"
 #include "support/Log.h"
 
@@ -65,7 +66,7 @@ struct ChunkSums {
     double distance[kChunk]; // 1 - cosine + offset
 };
 
-void sumChunk(const SimilarityInput& in, size_t start, size_t count, ChunkSums& sums)
+[[gnu::always_inline]] inline void sumChunk(const SimilarityInput& in, size_t start, size_t count, ChunkSums& sums)
 {
     for (size_t k = 0; k < count; ++k)
         sums.dot[k] = sums.squares[k] = 0.0;
@@ -83,7 +84,8 @@ void sumChunk(const SimilarityInput& in, size_t start, size_t count, ChunkSums& 
 // The exponent 2 is a product: the correctly rounded square that pow stands
 // for, without the cost of a general power.
 template <bool Squared>
-void chunkWeights(const SimilarityInput& in, ChunkSums& sums, size_t count, float* weights)
+[[gnu::always_inline]] inline void chunkWeights(const SimilarityInput& in, ChunkSums& sums, size_t count,
+                                                float* weights)
 {
     for (size_t k = 0; k < count; ++k) {
         double product = sums.squares[k] * in.measuredSquares;
@@ -92,6 +94,16 @@ void chunkWeights(const SimilarityInput& in, ChunkSums& sums, size_t count, floa
         double power = Squared ? d * d : std::pow(d, in.exponent);
         weights[k] = static_cast<float>(1.0 / power);
     }
+}
+
+// Whether a guard may fire in the chunk (a zero product or distance): a
+// branch-free count, so that the sample-by-sample check runs only then.
+[[gnu::always_inline]] inline bool chunkSuspicious(const SimilarityInput& in, const ChunkSums& sums, size_t count)
+{
+    int zeros = 0;
+    for (size_t k = 0; k < count; ++k)
+        zeros += int(sums.squares[k] * in.measuredSquares == 0.0) + int(sums.distance[k] == 0.0);
+    return zeros != 0;
 }
 
 // Logs the first sample of the chunk for which a guard fires; false if none does.
@@ -111,6 +123,30 @@ bool guardFired(const SimilarityInput& in, const ChunkSums& sums, size_t count)
     return false;
 }
 
+// The weights chunk by chunk; false at the first chunk in which a guard fires.
+// Compiled once per SimdLevel (colour/SimdTargets.h).
+template <bool Squared>
+[[gnu::always_inline]] inline bool weighChunks(const SimilarityInput& in, float* weights)
+{
+    ChunkSums sums;
+    for (size_t start = 0; start < in.N; start += kChunk) {
+        size_t count = std::min(kChunk, in.N - start);
+        sumChunk(in, start, count, sums);
+        chunkWeights<Squared>(in, sums, count, weights + start);
+        if (chunkSuspicious(in, sums, count) && guardFired(in, sums, count))
+            return false;
+    }
+    return true;
+}
+
+[[gnu::always_inline]] inline bool weighSamples(const SimilarityInput& in, bool squared, float* weights)
+{
+    return squared ? weighChunks<true>(in, weights) : weighChunks<false>(in, weights);
+}
+
+VANTISH_SIMD_VARIANTS(weighSamplesAt, weighSamples, bool, (const SimilarityInput& in, bool squared, float* weights),
+                      (in, squared, weights))
+
 // 1 / (1 - cos(angle between measurement and sample) + c)^p for every sample,
 // in double precision. sigma, when given, undoes the per-channel scaling of
 // the database (channels with sigma 0 were left unscaled). Stops at the first
@@ -125,51 +161,50 @@ bool similarityWeights(const SpectralDatabase& db, const float* channels, int M,
         in.measuredSquares += in.x[j] * in.x[j];
         in.scale[j] = sigma && sigma[j] != 0.0f ? double(sigma[j]) : 1.0;
     }
-    const bool squared = settings.exponent == 2.0;
-    ChunkSums sums;
-    for (size_t start = 0; start < in.N; start += kChunk) {
-        size_t count = std::min(kChunk, in.N - start);
-        sumChunk(in, start, count, sums);
-        if (squared)
-            chunkWeights<true>(in, sums, count, weights + start);
-        else
-            chunkWeights<false>(in, sums, count, weights + start);
-        if (guardFired(in, sums, count))
-            return false;
-    }
-    return true;
+    return weighSamplesAt(activeSimdLevel(), in, settings.exponent == 2.0, weights);
 }
 
 // The largest weight, or 0 when none is above 0. Comparing the floats orders
-// them as their widened values would; four running maxima keep the loop off
+// them as their widened values would; sixteen running maxima keep the loop off
 // one dependency chain and give the same answer, the maximum being the same
-// in any order.
-float largestWeight(const float* weights, size_t N)
+// in any order (a NaN is never taken).
+[[gnu::always_inline]] inline float largestWeight(const float* weights, size_t N)
 {
-    float lanes[4] = {};
+    constexpr size_t kLanes = 16;
+    float lanes[kLanes] = {};
     size_t i = 0;
-    for (; i + 3 < N; i += 4)
-        for (int l = 0; l < 4; ++l)
+    for (; i + kLanes <= N; i += kLanes)
+        for (size_t l = 0; l < kLanes; ++l)
             lanes[l] = weights[i + l] > lanes[l] ? weights[i + l] : lanes[l];
     for (; i < N; ++i)
         lanes[0] = weights[i] > lanes[0] ? weights[i] : lanes[0];
     float largest = lanes[0];
-    for (int l = 1; l < 4; ++l)
+    for (size_t l = 1; l < kLanes; ++l)
         largest = lanes[l] > largest ? lanes[l] : largest;
     return largest;
 }
 
-// Scales the weights so that the largest is 1 and puts the measurement into
-// the sigma-scaled space of the database.
-void normaliseWeightsAndMeasurement(size_t N, float* weights, float* channels, int M, const float* sigma)
+// Divides every weight by the largest (in double precision); returns the
+// largest. Compiled once per SimdLevel.
+[[gnu::always_inline]] inline float scaleWeights(size_t N, float* weights)
 {
-    float largest = largestWeight(weights, N);
-    VLOG_DEBUG("Normalization - Max WW = %f \n", double(largest));
+    const float largest = largestWeight(weights, N);
     if (largest != 0.0f) {
         const double divisor = largest;
         for (size_t i = 0; i < N; ++i)
             weights[i] = static_cast<float>(weights[i] / divisor);
     }
+    return largest;
+}
+
+VANTISH_SIMD_VARIANTS(scaleWeightsAt, scaleWeights, float, (size_t N, float* weights), (N, weights))
+
+// Scales the weights so that the largest is 1 and puts the measurement into
+// the sigma-scaled space of the database.
+void normaliseWeightsAndMeasurement(size_t N, float* weights, float* channels, int M, const float* sigma)
+{
+    const float largest = scaleWeightsAt(activeSimdLevel(), N, weights);
+    VLOG_DEBUG("Normalization - Max WW = %f \n", double(largest));
     if (sigma)
         for (int j = 0; j < M; ++j)
             if (sigma[j] != 0.0f)

@@ -19,6 +19,7 @@
 // single-precision accuracy.
 // Everything else (a negative or non-finite lambda, a non-finite weight, a
 // factor that breaks down) takes the augmented system.
+#include "colour/SimdTargets.h"
 #include "colour/SolverSupport.h"
 
 #include <Accelerate/Accelerate.h>
@@ -108,9 +109,11 @@ struct PartitionedSamples {
     }
 };
 
+} // namespace
+
 // The augmented system with the heavy samples as unknowns, light ones folded
 // into the lower-right block.
-void augmentedSolve(int N, int M, const float* T, const float* w, const float* R, float* H, float lambda)
+void solver::augmentedSolve(int N, int M, const float* T, const float* w, const float* R, float* H, float lambda)
 {
     PartitionedSamples samples;
     if (!samples.copy(N, M, R, T, w)) {
@@ -162,19 +165,76 @@ void augmentedSolve(int N, int M, const float* T, const float* w, const float* R
             H[4 * j + c] = b[size_t(c) * n + K + j];
 }
 
+namespace {
+
+
+// One reflection per column folds the heavy rows (K rows of W doubles: the
+// channels, X, Y, Z, then zeros) into the triangle U (M rows of W doubles).
+// A reflection for column k touches only row k of U and the heavy rows (U's
+// rows below k are zero in column k). Every row is processed at its full
+// width W: columns left of k are zero in the heavy rows and in row k of U, so
+// they stay as they are, and column k is set afterwards. Fixed widths let the
+// row loops run on vectors; each element is updated with the same operations
+// in the same order whatever the vector width.
+template <int W>
+[[gnu::always_inline]] inline void foldHeavyRows(int M, int K, double (*U)[W], double* rows)
+{
+    for (int k = 0; k < M; ++k) {
+        double lanes[4] = {};
+        int h = 0;
+        for (; h + 3 < K; h += 4)
+            for (int l = 0; l < 4; ++l)
+                lanes[l] += rows[size_t(h + l) * W + k] * rows[size_t(h + l) * W + k];
+        for (; h < K; ++h)
+            lanes[0] += rows[size_t(h) * W + k] * rows[size_t(h) * W + k];
+        const double sigma = (lanes[0] + lanes[1]) + (lanes[2] + lanes[3]);
+        if (sigma == 0.0)
+            continue;
+        const double alpha = U[k][k];
+        const double norm = std::sqrt(alpha * alpha + sigma);
+        const double beta = alpha <= 0.0 ? norm : -norm;
+        const double tau = (beta - alpha) / beta;
+        const double scale = 1.0 / (alpha - beta); // v = (1, heavy column k * scale)
+
+        double dot[W];
+        for (int j = 0; j < W; ++j)
+            dot[j] = U[k][j];
+        for (h = 0; h < K; ++h) {
+            const double* row = rows + size_t(h) * W;
+            const double v = row[k] * scale;
+            for (int j = 0; j < W; ++j)
+                dot[j] += v * row[j];
+        }
+        for (int j = 0; j < W; ++j) {
+            dot[j] *= tau;
+            U[k][j] -= dot[j];
+        }
+        for (h = 0; h < K; ++h) {
+            double* row = rows + size_t(h) * W;
+            const double v = row[k] * scale;
+            for (int j = 0; j < W; ++j)
+                row[j] -= v * dot[j];
+            row[k] = 0.0;
+        }
+        U[k][k] = beta;
+    }
+}
+
+VANTISH_SIMD_VARIANTS(foldHeavyRows8At, foldHeavyRows<8>, void, (int M, int K, double (*U)[8], double* rows),
+                      (M, K, U, rows))
+VANTISH_SIMD_VARIANTS(foldHeavyRows20At, foldHeavyRows<20>, void, (int M, int K, double (*U)[20], double* rows),
+                      (M, K, U, rows))
 
 // The regularised least-squares problem as an upper triangle U (M x M) with
 // the right-hand side Z (M x 3), min |U H - Z|: the light samples and lambda
 // through the Cholesky factor of G_l + lambda I, then the heavy samples as rows
-// sqrt(w) (r^T | t^T) folded in by one Householder reflection per column. A
-// reflection touches only its own row of U and the heavy rows (U's rows below
-// stay zero in that column), so the cost is linear in the heavy samples. False,
-// H untouched, when the problem is not one this path takes.
+// sqrt(w) (r^T | t^T) folded in by Householder reflections, so the cost is
+// linear in the samples. Rows are W doubles wide (M + 3 columns, padded).
+// False, H untouched, when the problem is not one this path takes.
+template <int W>
 bool stackedSolve(int N, int M, const float* T, const float* w, const float* R, float* H, float lambda)
 {
-    if (!(lambda > 0.0f) || !std::isfinite(lambda))
-        return false;
-    const int columns = M + 3; // the channels, then X, Y and Z
+    static_assert(W >= kSolverMaxChannels + 3 || W == 8);
     auto lightWeights = allocateArray<float>(size_t(std::max(N, 1)));
     if (!lightWeights)
         return false;
@@ -186,7 +246,7 @@ bool stackedSolve(int N, int M, const float* T, const float* w, const float* R, 
         lightWeights[i] = heavy ? 0.0f : w[i];
         K += heavy ? 1 : 0;
     }
-    auto heavyRows = allocateArray<double>(size_t(std::max(K, 1)) * size_t(columns));
+    auto heavyRows = allocateArray<double>(size_t(std::max(K, 1)) * W, true);
     if (!heavyRows)
         return false;
 
@@ -195,7 +255,7 @@ bool stackedSolve(int N, int M, const float* T, const float* w, const float* R, 
     float cross[4 * kSolverMaxChannels];
     weightedGramPacked(N, M, R, N, lightWeights.get(), gram);
     weightedCrossProduct(N, M, T, N, lightWeights.get(), R, N, cross);
-    double U[kSolverMaxChannels][kSolverMaxChannels + 3] = {};
+    double U[kSolverMaxChannels][W] = {};
     for (int a = 0; a < M; ++a) {
         for (int b = a; b < M; ++b)
             U[a][b] = gram[packedIndex(M, a, b)];
@@ -222,59 +282,22 @@ bool stackedSolve(int N, int M, const float* T, const float* w, const float* R, 
         }
     }
 
-    // The heavy rows, row-major.
+    // The heavy rows.
     double* rows = heavyRows.get();
     for (int i = 0, h = 0; i < N; ++i) {
         if (!isHeavy(w[i]))
             continue;
         const double s = std::sqrt(double(w[i]));
-        double* row = rows + size_t(h++) * columns;
+        double* row = rows + size_t(h++) * W;
         for (int j = 0; j < M; ++j)
             row[j] = s * double(R[size_t(j) * N + i]);
         for (int c = 0; c < 3; ++c)
             row[M + c] = s * double(T[size_t(c) * N + i]);
     }
-
-    // One reflection per column k, acting on row k of U and the heavy rows.
-    for (int k = 0; k < M; ++k) {
-        double lanes[4] = {};
-        int h = 0;
-        for (; h + 3 < K; h += 4)
-            for (int l = 0; l < 4; ++l)
-                lanes[l] += rows[size_t(h + l) * columns + k] * rows[size_t(h + l) * columns + k];
-        for (; h < K; ++h)
-            lanes[0] += rows[size_t(h) * columns + k] * rows[size_t(h) * columns + k];
-        const double sigma = (lanes[0] + lanes[1]) + (lanes[2] + lanes[3]);
-        if (sigma == 0.0)
-            continue;
-        const double alpha = U[k][k];
-        const double norm = std::sqrt(alpha * alpha + sigma);
-        const double beta = alpha <= 0.0 ? norm : -norm;
-        const double tau = (beta - alpha) / beta;
-        const double scale = 1.0 / (alpha - beta); // v = (1, heavy column k * scale)
-
-        double dot[kSolverMaxChannels + 3];
-        for (int j = k + 1; j < columns; ++j)
-            dot[j] = U[k][j];
-        for (h = 0; h < K; ++h) {
-            const double* row = rows + size_t(h) * columns;
-            const double v = row[k] * scale;
-            for (int j = k + 1; j < columns; ++j)
-                dot[j] += v * row[j];
-        }
-        for (int j = k + 1; j < columns; ++j) {
-            dot[j] *= tau;
-            U[k][j] -= dot[j];
-        }
-        for (h = 0; h < K; ++h) {
-            double* row = rows + size_t(h) * columns;
-            const double v = row[k] * scale;
-            for (int j = k + 1; j < columns; ++j)
-                row[j] -= v * dot[j];
-            row[k] = 0.0;
-        }
-        U[k][k] = beta;
-    }
+    if constexpr (W == 8)
+        foldHeavyRows8At(activeSimdLevel(), M, K, U, rows);
+    else
+        foldHeavyRows20At(activeSimdLevel(), M, K, U, rows);
 
     // U H = Z.
     double X[kSolverMaxChannels][3];
@@ -292,6 +315,16 @@ bool stackedSolve(int N, int M, const float* T, const float* w, const float* R, 
         for (int c = 0; c < 3; ++c)
             H[4 * a + c] = float(X[a][c]);
     return true;
+}
+
+// The linear path for a positive, finite lambda; false when it does not apply.
+bool stackedSolve(int N, int M, const float* T, const float* w, const float* R, float* H, float lambda)
+{
+    if (!(lambda > 0.0f) || !std::isfinite(lambda))
+        return false;
+    if (M + 3 <= 8)
+        return stackedSolve<8>(N, M, T, w, R, H, lambda);
+    return stackedSolve<20>(N, M, T, w, R, H, lambda);
 }
 
 } // namespace

@@ -31,6 +31,12 @@ inline void markFailed(int M, float* H)
         H[k] = std::numeric_limits<float>::quiet_NaN();
 }
 
+// The regularised problem with heavy weights (100 or more) as the augmented
+// symmetric indefinite system of order M + K, K the heavy samples, solved by
+// LAPACK. The dispatcher's path for a negative or non-finite lambda and for
+// weights that are not finite.
+void augmentedSolve(int N, int M, const float* T, const float* w, const float* R, float* H, float lambda);
+
 // Arguments every solver accepts; anything else is marked failed by the caller.
 inline bool argumentsUsable(int N, int M) { return N >= 0 && M >= 1 && M <= kSolverMaxChannels; }
 

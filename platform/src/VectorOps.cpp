@@ -9,15 +9,39 @@
 // not a number either, and callers test for it.
 void vDSP_maxv(const float* A, vDSP_Stride IA, float* C, vDSP_Length N)
 {
-    float largest = -std::numeric_limits<float>::infinity();
-    for (vDSP_Length n = 0; n < N; ++n) {
-        float v = A[ptrdiff_t(n) * IA];
-        if (std::isnan(v)) {
-            largest = v;
-            break;
+    // Sixteen running maxima (the maximum does not depend on the order) and a
+    // note of any NaN; only then the first NaN is looked for, as it is the result.
+    constexpr vDSP_Length kLanes = 16;
+    float lanes[kLanes];
+    for (float& lane : lanes)
+        lane = -std::numeric_limits<float>::infinity();
+    int nans = 0; // counted without branches, so the loop vectorises
+    vDSP_Length n = 0;
+    if (IA == 1) {
+        for (; n + kLanes <= N; n += kLanes) {
+            for (vDSP_Length l = 0; l < kLanes; ++l) {
+                const float v = A[n + l];
+                nans += int(v != v);
+                lanes[l] = v > lanes[l] ? v : lanes[l];
+            }
         }
-        if (v > largest)
-            largest = v;
+    }
+    for (; n < N; ++n) {
+        const float v = A[ptrdiff_t(n) * IA];
+        nans += int(v != v);
+        lanes[0] = v > lanes[0] ? v : lanes[0];
+    }
+    float largest = lanes[0];
+    for (vDSP_Length l = 1; l < kLanes; ++l)
+        largest = lanes[l] > largest ? lanes[l] : largest;
+    if (nans != 0) {
+        for (n = 0; n < N; ++n) {
+            const float v = A[ptrdiff_t(n) * IA];
+            if (std::isnan(v)) {
+                largest = v;
+                break;
+            }
+        }
     }
     *C = largest;
 }

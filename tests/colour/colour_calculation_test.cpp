@@ -3,6 +3,8 @@
 #include "SolverReference.h"
 #include "colour/ColourCalculation.h"
 #include "colour/MatrixUtilities.h"
+#include "colour/SimdLevel.h"
+#include "colour/Solvers.h"
 #include "support/TestSupport.h"
 
 #include <gtest/gtest.h>
@@ -10,6 +12,8 @@
 #include <array>
 #include <cmath>
 #include <cstdio>
+#include <cstring>
+#include <optional>
 
 using namespace colourtest;
 
@@ -403,4 +407,64 @@ TEST(MatrixProduct, RowMajorWithSizeCheck)
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "wrong matrix size \n"));
     // Nothing to compute is still a match.
     EXPECT_TRUE(multiplyMatrices(A, 0, 4, B, 4, 1, untouched));
+}
+
+// Every vector level this processor runs gives the bits of the baseline build:
+// the fit as a whole in each mode, and the weighted sums on their own (sizes
+// that leave every tail of the eight-, four- and two-lane blocks).
+TEST(SimdLevels, EveryLevelGivesTheBaselineBits)
+{
+    struct ForcedLevel {
+        explicit ForcedLevel(SimdLevel level) { forceSimdLevel(level); }
+        ~ForcedLevel() { forceSimdLevel(std::nullopt); }
+    };
+    std::vector<SimdLevel> levels{SimdLevel::Baseline};
+    for (SimdLevel level : {SimdLevel::Avx2, SimdLevel::Avx512})
+        if (int(level) <= int(detectedSimdLevel()))
+            levels.push_back(level);
+
+    struct Mode {
+        bool normalised;
+        float lambda, exponent;
+    };
+    for (int N : {203, 1000}) {
+        SpectralDatabase raw = makeDatabase(N, 5, 40u + unsigned(N));
+        SpectralDatabase normalised = raw;
+        normaliseDatabase(normalised);
+        for (const Mode& mode : {Mode{false, 0.0f, 2.0f}, Mode{true, 0.01f, 2.0f}, Mode{false, 0.01f, 2.0f},
+                                 Mode{false, 0.0f, 1.7f}}) {
+            const FitSettings fit{mode.exponent, 0.00001f, mode.lambda, mode.normalised};
+            const SpectralDatabase& db = mode.normalised ? normalised : raw;
+            std::vector<XYZ> results;
+            for (SimdLevel level : levels) {
+                ForcedLevel forced(level);
+                std::vector<float> x = kMeasured5;
+                XYZ xyz{};
+                EXPECT_TRUE(colourCalculationDynamic(db, fit, x.data(), xyz.data(), 5));
+                results.push_back(xyz);
+            }
+            for (size_t l = 1; l < results.size(); ++l)
+                EXPECT_EQ(std::memcmp(results[l].data(), results[0].data(), sizeof(XYZ)), 0)
+                    << simdLevelName(levels[l]) << " N=" << N << " lambda=" << mode.lambda;
+        }
+
+        std::vector<float> w(static_cast<size_t>(N));
+        for (int i = 0; i < N; ++i)
+            w[size_t(i)] = 0.25f + float(i % 7);
+        std::vector<std::vector<float>> sums;
+        for (SimdLevel level : levels) {
+            ForcedLevel forced(level);
+            for (int count : {N, N - 1, N - 2, N - 5}) {
+                std::vector<float> out(4 * 5 + 15, 0.0f);
+                weightedCrossProduct(count, 5, raw.dbXYZ.data(), N, w.data(), raw.dbChannelResponses.data(), N,
+                                     out.data());
+                weightedGramPacked(count, 5, raw.dbChannelResponses.data(), N, w.data(), out.data() + 20);
+                sums.push_back(out);
+            }
+        }
+        for (size_t s = 4; s < sums.size(); ++s)
+            EXPECT_EQ(std::memcmp(sums[s].data(), sums[s % 4].data(), sums[s].size() * sizeof(float)), 0) << s;
+    }
+    std::printf("vector levels compared: %zu (this processor: %s)\n", levels.size(),
+                simdLevelName(detectedSimdLevel()));
 }

@@ -2,12 +2,14 @@
 // member and every dispatch path on well-conditioned problems, any channel
 // count, and the kernels' own contracts.
 #include "SolverReference.h"
+#include "colour/SolverSupport.h"
 #include "colour/Solvers.h"
 
 #include <gtest/gtest.h>
 
 #include <cmath>
 #include <cstring>
+#include <random>
 
 using namespace colourtest;
 
@@ -76,6 +78,74 @@ TEST(SolverDispatch, PicksThePathByLambdaAndTheLargestWeight)
     EXPECT_LT(relativeError(coefficients(run(hybridSolveWithRegularization, heavy, 500.0f), 5),
                             coefficients(run(generalSolveWithRegularization, heavy, 500.0f), 5)),
               kTolerance);
+}
+
+// Weights 1 to 10^12, log-uniform: most samples heavy, some extremely so.
+Problem wideWeights(int N, int M, unsigned seed)
+{
+    Problem p = randomProblem(N, M, seed);
+    std::mt19937 rng(seed + 100);
+    std::uniform_real_distribution<double> exponent(0.0, 12.0);
+    for (float& w : p.w)
+        w = float(std::pow(10.0, exponent(rng)));
+    return p;
+}
+
+TEST(HeavySamples, TheLinearPathAgreesWithTheClosedForm)
+{
+    struct Case {
+        const char* name;
+        Problem p;
+        float lambda;
+    };
+    Problem one = randomProblem(150, 5, 21u, Weights::OneHeavy); // K = 1
+    Problem all = randomProblem(150, 4, 22u, Weights::AllHeavy); // K = N
+    // Light samples that cannot tell channels 3 and 4 apart (a rank-deficient
+    // light block); a few heavy ones that can.
+    Problem deficient = randomProblem(150, 5, 23u);
+    for (int i = 0; i < deficient.N; ++i)
+        deficient.R[size_t(4) * deficient.N + i] = deficient.R[size_t(3) * deficient.N + i];
+    for (int i : {10, 70, 140})
+        deficient.w[i] = 1e6f, deficient.R[size_t(4) * deficient.N + i] = 0.5f;
+    // Light samples with one channel always zero and no heavy sample seeing it.
+    Problem blind = randomProblem(150, 4, 24u, Weights::OneHeavy);
+    for (int i = 0; i < blind.N; ++i)
+        blind.R[size_t(2) * blind.N + i] = 0.0f;
+    for (const Case& c : {Case{"one heavy", one, 0.5f}, Case{"all heavy", all, 2000.0f},
+                          Case{"wide weights", wideWeights(400, 5, 25u), 0.01f},
+                          Case{"wide weights, strong ridge", wideWeights(400, 4, 26u), 1e4f},
+                          Case{"rank-deficient light block", deficient, 0.01f},
+                          Case{"twelve channels", wideWeights(300, 12, 27u), 0.5f},
+                          Case{"a channel nobody sees", blind, 0.01f}}) {
+        EXPECT_LT(relativeError(coefficients(run(hybridSolveWithRegularization, c.p, c.lambda), c.p.M),
+                                closedForm(c.p, c.lambda)),
+                  kTolerance)
+            << c.name;
+    }
+}
+
+TEST(HeavySamples, NegativeOrNonFiniteInputsKeepTheAugmentedSystem)
+{
+    // Called directly: a NaN weight is not equal to itself, so the usual
+    // check that the arrays are unchanged cannot be used here.
+    auto solve = [](Regularised solver, const Problem& p, float lambda) {
+        std::vector<float> H(size_t(4) * p.M, kUnset);
+        solver(p.N, p.M, p.T.data(), p.w.data(), p.R.data(), H.data(), lambda);
+        return H;
+    };
+    auto augmented = [](int N, int M, const float* T, const float* w, const float* R, float* H, float lambda) {
+        solver::augmentedSolve(N, M, T, w, R, H, lambda);
+    };
+    Problem p = randomProblem(120, 5, 31u, Weights::OneHeavy);
+    EXPECT_TRUE(sameBits(solve(hybridSolveWithRegularization, p, -0.5f), solve(augmented, p, -0.5f)));
+    EXPECT_TRUE(sameBits(solve(hybridSolveWithRegularization, p, INFINITY), solve(augmented, p, INFINITY)));
+    p.w[7] = NAN;
+    EXPECT_TRUE(sameBits(solve(hybridSolveWithRegularization, p, 0.5f), solve(augmented, p, 0.5f)));
+    p.w[7] = INFINITY;
+    EXPECT_TRUE(sameBits(solve(hybridSolveWithRegularization, p, 0.5f), solve(augmented, p, 0.5f)));
+    // A finite positive lambda takes the linear path: not the same bits.
+    p.w[7] = 1.0f;
+    EXPECT_FALSE(sameBits(solve(hybridSolveWithRegularization, p, 0.5f), solve(augmented, p, 0.5f)));
 }
 
 TEST(SolverFamily, AnyChannelCountUpToTheLimit)
