@@ -123,6 +123,8 @@ int runEvaluation(const CommonOptions& common, const EvalOptions& options)
 
         const host::GlobalMatrixBaseline baseline(unit, spectra::referenceSources(unit.referenceSet));
         std::unique_ptr<OpenedUnit> opened = openUnit(common, options.device);
+        if (!applyAssignments(*opened, options.sets))
+            return 2;
 
         std::printf("Unit       %s%s%s\n", description.name.c_str(), description.summary.empty() ? "" : " - ",
                     description.summary.c_str());
@@ -182,6 +184,9 @@ Runner addEvalCommand(CLI::App& app, const CommonOptions& common)
     app.add_option("--lux", options->lux, "Illuminance of every reading")
         ->check(CLI::PositiveNumber)
         ->capture_default_str();
+    app.add_option("--set", options->sets,
+                   "Set a client property before the first reading, KEY=VALUE with VALUE in JSON, as for\n"
+                   "vantish run (ColorAlgoLambda=0.01 evaluates the fit with a client's lambda)");
     app.footer("For each light: the true chromaticity and CCT (CIE 1931 2°), the plug-in's estimate through its\n"
                "filter, and the estimate of one global least-squares channel-to-XYZ matrix fitted over the unit's\n"
                "reference sources, both from the same noise-free reading; errors as Δu′v′ and ΔCCT; summary:\n"

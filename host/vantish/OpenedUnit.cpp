@@ -1,7 +1,11 @@
 #include "host/vantish/OpenedUnit.h"
 
+#include "host/inputs/EventInput.h"
+#include "support/CFOwned.h"
+
 #include <VantishPlatform/LogControl.h>
 
+#include <iostream>
 #include <stdexcept>
 
 namespace vantish {
@@ -46,6 +50,41 @@ void applyLogOption(const CommonOptions& common)
 CFTypeRef clientPropertyValue(const nlohmann::json& value)
 {
     return host::createPropertyValue(value, ".", "property value");
+}
+
+bool setProperty(OpenedUnit& opened, const std::string& key, const nlohmann::json& value, std::string& error)
+{
+    try {
+        const CFOwned<CFTypeRef> cfValue(clientPropertyValue(value));
+        const CFOwned<CFStringRef> cfKey(CFStringCreateWithCString(nullptr, key.c_str(), kCFStringEncodingUTF8));
+        // A property key is a CF string: text that is not UTF-8 cannot be one.
+        if (!cfKey) {
+            error = "the key is not UTF-8 text";
+            return false;
+        }
+        opened.session->setProperty(cfKey.get(), cfValue.get());
+        return true;
+    } catch (const std::exception& e) {
+        error = e.what();
+        return false;
+    }
+}
+
+bool applyAssignments(OpenedUnit& opened, const std::vector<std::string>& assignments)
+{
+    for (const auto& assignment : assignments) {
+        auto parsed = host::parseAssignment(assignment);
+        std::string error;
+        if (!parsed) {
+            std::cerr << "vantish: --set " << assignment << ": expected KEY=VALUE\n";
+            return false;
+        }
+        if (!setProperty(opened, parsed->first, parsed->second, error)) {
+            std::cerr << "vantish: --set " << assignment << ": " << error << "\n";
+            return false;
+        }
+    }
+    return true;
 }
 
 } // namespace vantish

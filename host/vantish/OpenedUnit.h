@@ -36,4 +36,12 @@ void applyLogOption(const CommonOptions& common);
 // A CF value (caller releases) for a client property given in JSON.
 CFTypeRef clientPropertyValue(const nlohmann::json& value);
 
+// Sets a client property on the opened plug-in; false with `error` set when
+// the key or value cannot be one.
+bool setProperty(OpenedUnit& opened, const std::string& key, const nlohmann::json& value, std::string& error);
+
+// The --set options (KEY=VALUE, VALUE in JSON), in order; false after one
+// line on stderr for the first that cannot be set.
+bool applyAssignments(OpenedUnit& opened, const std::vector<std::string>& assignments);
+
 } // namespace vantish

@@ -72,24 +72,6 @@ private:
     bool json_;
 };
 
-bool setProperty(OpenedUnit& opened, const std::string& key, const nlohmann::json& value, std::string& error)
-{
-    try {
-        const CFOwned<CFTypeRef> cfValue(clientPropertyValue(value));
-        const CFOwned<CFStringRef> cfKey(CFStringCreateWithCString(nullptr, key.c_str(), kCFStringEncodingUTF8));
-        // A property key is a CF string: text that is not UTF-8 cannot be one.
-        if (!cfKey) {
-            error = "the key is not UTF-8 text";
-            return false;
-        }
-        opened.session->setProperty(cfKey.get(), cfValue.get());
-        return true;
-    } catch (const std::exception& e) {
-        error = e.what();
-        return false;
-    }
-}
-
 int runEvents(const CommonOptions& common, const RunOptions& options)
 {
     applyLogOption(common);
@@ -101,18 +83,8 @@ int runEvents(const CommonOptions& common, const RunOptions& options)
         return 2;
     }
 
-    for (const auto& assignment : options.sets) {
-        auto parsed = host::parseAssignment(assignment);
-        std::string error;
-        if (!parsed) {
-            std::cerr << "vantish: --set " << assignment << ": expected KEY=VALUE\n";
-            return 2;
-        }
-        if (!setProperty(*opened, parsed->first, parsed->second, error)) {
-            std::cerr << "vantish: --set " << assignment << ": " << error << "\n";
-            return 2;
-        }
-    }
+    if (!applyAssignments(*opened, options.sets))
+        return 2;
 
     std::ifstream file;
     std::istream* in = &std::cin;

@@ -81,6 +81,20 @@ inline Eigen::MatrixXd closedForm(const Problem& p, double lambda)
     return G.ldlt().solve(RW * targets(p));
 }
 
+// The same by a QR factorisation of the stacked system [sqrt(W) R^T; sqrt(lambda) I],
+// which stays accurate where the normal equations lose digits (weights spanning
+// many orders of magnitude, nearly parallel samples).
+inline Eigen::MatrixXd closedFormQR(const Problem& p, double lambda)
+{
+    Eigen::VectorXd s = weights(p).cwiseSqrt();
+    Eigen::MatrixXd A(p.N + p.M, p.M), B(p.N + p.M, 3);
+    A.topRows(p.N) = s.asDiagonal() * responses(p).transpose();
+    A.bottomRows(p.M) = std::sqrt(lambda) * Eigen::MatrixXd::Identity(p.M, p.M);
+    B.topRows(p.N) = s.asDiagonal() * targets(p);
+    B.bottomRows(p.M).setZero();
+    return A.colPivHouseholderQr().solve(B);
+}
+
 // The minimum-norm weighted least-squares solution, M x 3, for any rank.
 inline Eigen::MatrixXd minimumNorm(const Problem& p)
 {

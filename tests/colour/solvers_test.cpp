@@ -124,6 +124,37 @@ TEST(HeavySamples, TheLinearPathAgreesWithTheClosedForm)
     }
 }
 
+// What a client's lambda meets in the plug-in: samples of a few light
+// families pointing in nearly the same direction, weighted by their similarity
+// to a measurement (up to 10^10), so nearly every sample is heavy and the few
+// light ones leave their Gram matrix close to singular.
+TEST(HeavySamples, SimilarityWeightsOnNearlyParallelSamples)
+{
+    for (int M : {4, 5}) {
+        Problem p = randomProblem(425, M, 41u + unsigned(M));
+        std::mt19937 rng(51u + unsigned(M));
+        std::uniform_real_distribution<float> spread(-0.03f, 0.03f);
+        std::vector<double> x(static_cast<size_t>(M));
+        for (int j = 0; j < M; ++j)
+            x[size_t(j)] = 1.0 + 0.4 * j;
+        for (int i = 0; i < p.N; ++i)
+            for (int j = 0; j < M; ++j)
+                p.R[size_t(j) * p.N + i] = float(x[size_t(j)] * (1.0 + spread(rng) * (1 + i % 3)));
+        for (int i = 0; i < p.N; ++i) {
+            double dot = 0, rr = 0, xx = 0;
+            for (int j = 0; j < M; ++j) {
+                const double r = p.R[size_t(j) * p.N + i];
+                dot += r * x[size_t(j)], rr += r * r, xx += x[size_t(j)] * x[size_t(j)];
+            }
+            const double d = 1.0 - dot / std::sqrt(rr * xx) + 0.00001;
+            p.w[size_t(i)] = float(1.0 / (d * d));
+        }
+        EXPECT_LT(relativeError(coefficients(run(hybridSolveWithRegularization, p, 0.01f), M), closedFormQR(p, 0.01)),
+                  kTolerance)
+            << "M=" << M;
+    }
+}
+
 TEST(HeavySamples, NegativeOrNonFiniteInputsKeepTheAugmentedSystem)
 {
     // Called directly: a NaN weight is not equal to itself, so the usual
