@@ -3,11 +3,8 @@
 #include <VantishPlatform/DispatchControl.h>
 #include <VantishPlatform/Paths.h>
 
-#include <gtest/gtest.h>
-
 #include <algorithm>
 #include <atomic>
-#include <cstdlib>
 #include <unistd.h>
 
 namespace vt {
@@ -96,24 +93,3 @@ std::string bundleDir() { return VANTISH_BUNDLE_DIR; }
 std::string sourceDir() { return VANTISH_SOURCE_DIR; }
 
 } // namespace vt
-
-// Test programs keep their logs quiet unless VANTISH_TEST_LOG is set, and
-// never leave queued work running between tests.
-namespace {
-class QuietEnvironment : public ::testing::Environment {
-public:
-    void SetUp() override
-    {
-        if (!std::getenv("VANTISH_TEST_LOG"))
-            VPLogSetEcho(false);
-    }
-    void TearDown() override { VPDispatchDrain(); }
-};
-} // namespace
-
-int main(int argc, char** argv)
-{
-    ::testing::InitGoogleTest(&argc, argv);
-    ::testing::AddGlobalTestEnvironment(new QuietEnvironment);
-    return RUN_ALL_TESTS();
-}
