@@ -1,6 +1,6 @@
 // Events copied by clients: colour from the last filtered sample, the
 // chromaticity override, and the VD6287 path through the whole filter.
-#include "ALSEventBuilder.h"
+#include "PlugInState.h"
 #include "support/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
@@ -8,6 +8,7 @@
 #include <gtest/gtest.h>
 
 using namespace alstest;
+using namespace vt;
 
 namespace {
 
@@ -88,10 +89,9 @@ TEST_F(CopyEvent, NothingChangesWithoutADatabaseOrForOtherEvents)
     EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{}));
 
     parts(*plugin).databases().setReady(true);
-    IOHIDEventRef other = IOHIDEventCreate(kCFAllocatorDefault, kIOHIDEventTypeVendorDefined, 0, 0);
-    EXPECT_EQ(plugin->filterCopyEvent(other), other);
-    EXPECT_EQ(IOHIDEventGetIntegerValue(other, kIOHIDEventFieldAmbientLightColorSpace), 0);
-    CFRelease(other);
+    const Event other = createEvent(kIOHIDEventTypeVendorDefined, nullptr);
+    EXPECT_EQ(plugin->filterCopyEvent(other.get()), other.get());
+    EXPECT_EQ(colourSpaceOf(other.get()), 0);
     EXPECT_EQ(linesContaining("Copy event"), 0u);
 
     EXPECT_EQ(plugin->filterCopyEvent(nullptr), nullptr);

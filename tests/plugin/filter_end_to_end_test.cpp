@@ -4,7 +4,7 @@
 // channels, with XYZ from an analytic approximation of the 1931 observer.
 // The colorimetry is approximate; what matters is that the filter gives back
 // the chromaticity of the source the counts came from, at the record's lux.
-#include "ALSEventBuilder.h"
+#include "PlugInState.h"
 
 #include <gtest/gtest.h>
 
@@ -12,6 +12,7 @@
 #include <vector>
 
 using namespace alstest;
+using namespace vt;
 
 namespace {
 

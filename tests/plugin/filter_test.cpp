@@ -1,6 +1,6 @@
 // The event filter on events built as the driver sends them, against the
 // linear database.
-#include "ALSEventBuilder.h"
+#include "PlugInState.h"
 
 #include "support/TestSupport.h"
 
@@ -12,6 +12,7 @@
 #include <string>
 
 using namespace alstest;
+using namespace vt;
 
 namespace {
 
@@ -324,10 +325,9 @@ TEST_F(Filter, EventsWithoutRecordOrDatabasePassUnchanged)
     EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{1, 2, 3}));
 
     // Other event types and no event at all.
-    IOHIDEventRef other = IOHIDEventCreate(kCFAllocatorDefault, kIOHIDEventTypeVendorDefined, 0, 0);
-    EXPECT_EQ(plugin->filter(other, false), other);
-    EXPECT_EQ(IOHIDEventGetIntegerValue(other, kIOHIDEventFieldAmbientLightColorSpace), 0);
-    CFRelease(other);
+    const Event other = createEvent(kIOHIDEventTypeVendorDefined, nullptr);
+    EXPECT_EQ(plugin->filter(other.get(), false), other.get());
+    EXPECT_EQ(colourSpaceOf(other.get()), 0);
     EXPECT_EQ(plugin->filter(nullptr, false), nullptr);
 }
 

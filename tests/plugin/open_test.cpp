@@ -1,5 +1,5 @@
 // Matching services and reading the configuration at open.
-#include "plugin/TestAccess.h"
+#include "support/PlugInHolder.h"
 #include "support/TestSupport.h"
 
 #include <VantishPlatform/DeviceState.h>
@@ -39,12 +39,11 @@ protected:
         entry = VPRegistryCreateEntry(0x101, parent);
         service = VPServiceCreate(0x101);
         VPServiceAddUsage(service, 0xFF00, 0x0004);
-        plugin = static_cast<VantishPlugIn*>(VantishPlugInFactory(nullptr, kIOHIDServiceFilterPlugInTypeID));
     }
     void TearDown() override
     {
         VPDispatchDrain();
-        plugin->Release();
+        plugin.release();
         CFRelease(service);
         VPSetBootArgs(std::nullopt);
         VPRegistryReset();
@@ -67,7 +66,7 @@ protected:
 
     io_registry_entry_t parent = 0, entry = 0;
     IOHIDServiceRef service = nullptr;
-    VantishPlugIn* plugin = nullptr;
+    vt::PlugIn plugin;
     vt::DeviceRoots roots;
 };
 
@@ -200,7 +199,7 @@ TEST_F(Open, WithoutRegistryIdTheDeviceTreeIsNotRead)
 
 TEST_F(Open, RegistryHandleIsReleasedWithTheInstance)
 {
-    VantishPlugIn* other = static_cast<VantishPlugIn*>(VantishPlugInFactory(nullptr, kIOHIDServiceFilterPlugInTypeID));
+    vt::PlugIn other;
     other->open(service, 0);
     VPDispatchDrain();
     EXPECT_EQ(VPRegistryOutstandingReferences(entry), 1);
@@ -208,8 +207,8 @@ TEST_F(Open, RegistryHandleIsReleasedWithTheInstance)
     other->open(service, 0);
     VPDispatchDrain();
     EXPECT_EQ(VPRegistryOutstandingReferences(entry), 1);
-    EXPECT_EQ(parts(*other).registryEntry(), entry);
-    other->Release();
+    EXPECT_EQ(other.parts().registryEntry(), entry);
+    other.release();
     EXPECT_EQ(VPRegistryOutstandingReferences(entry), 0);
 }
 
@@ -225,13 +224,12 @@ TEST_F(Open, CalibrationPropertiesChooseTheBringUp)
         SCOPED_TRACE(c.line);
         VPServicePublishProperty(service, CFSTR("SysConfigCalibration"), c.sysConfig);
         VPServicePublishProperty(service, CFSTR("ALSCalibrationSpectrumToProcess"), c.spectrumToProcess);
-        VantishPlugIn* fresh = static_cast<VantishPlugIn*>(VantishPlugInFactory(nullptr, kIOHIDServiceFilterPlugInTypeID));
+        vt::PlugIn fresh;
         vt::LogCapture log(VPLogLevel::Info);
         fresh->open(service, 0);
         VPDispatchDrain();
         EXPECT_TRUE(log.contains(c.line));
         EXPECT_EQ(log.count("Getting QVT calibration...\n"), c.sysConfig ? 0u : 1u);
-        fresh->Release();
     }
 }
 

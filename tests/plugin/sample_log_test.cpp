@@ -1,11 +1,12 @@
 // The per-event log line of VD6287 services, compared character for character.
-#include "ALSEventBuilder.h"
+#include "PlugInState.h"
 
 #include "support/TestSupport.h"
 
 #include <gtest/gtest.h>
 
 using namespace alstest;
+using namespace vt;
 
 namespace {
 
@@ -114,9 +115,7 @@ TEST_F(SampleLog, OnlyForSensorType8AndALSEventsAtTheDefaultLevel)
     EXPECT_TRUE(logged(e.get(), true).empty());
 
     parts(*plugin).unit().sensorType = eALSSensorTypeVD6287;
-    IOHIDEventRef other = IOHIDEventCreate(kCFAllocatorDefault, kIOHIDEventTypeVendorDefined, 0, 0);
-    EXPECT_TRUE(logged(other, false).empty());
-    CFRelease(other);
+    EXPECT_TRUE(logged(createEvent(kIOHIDEventTypeVendorDefined, nullptr).get(), false).empty());
     EXPECT_TRUE(logged(nullptr, false).empty());
 
     vt::LogCapture errorsOnly(VPLogLevel::Error);
