@@ -3,11 +3,10 @@
 // service with a factory store, and a small reference database.
 #pragma once
 
-#include "plugin/TestAccess.h"
+#include "support/PlugInHolder.h"
 #include "support/TestSupport.h"
 
 #include <CoreFoundation/CoreFoundation.h>
-#include <IOKit/hid/IOHIDServiceFilterPlugIn.h>
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/DispatchControl.h>
 #include <VantishPlatform/HIDHost.h>
@@ -191,8 +190,6 @@ protected:
         VPSetPathRoot("/System/Library/HIDPlugins", system.str());
         VPQVTSetStoreDirectory(store.str());
         VPQVTResetReadCount();
-        plugin = static_cast<VantishPlugIn*>(VantishPlugInFactory(kCFAllocatorDefault, kIOHIDServiceFilterPlugInTypeID));
-        ASSERT_NE(plugin, nullptr);
         service = VPServiceCreate(7);
         parts(*plugin).service() = service;
     }
@@ -202,8 +199,7 @@ protected:
         VPDispatchFireDelayed();
         VPDispatchDrain();
         VPDispatchSetDelayMode(VPDelayMode::Real);
-        if (plugin)
-            plugin->Release();
+        plugin.release();
         CFRelease(service);
         VPQVTSetStoreDirectory("");
         VPTessaryReset();
@@ -234,7 +230,7 @@ protected:
     vt::TempDir system;
     vt::TempDir store;
     vt::LogCapture log{VPLogLevel::Debug};
-    VantishPlugIn* plugin = nullptr;
+    vt::PlugIn plugin;
     IOHIDServiceRef service = nullptr;
 };
 

@@ -52,8 +52,7 @@ TEST_F(QVTStoreTest, RetryKeepsTheInstanceAliveAndLoadsOnceTheStoreIsReady)
     // The host lets go of the instance while the retry is pending.
     CFUUIDRef factory = parts(*plugin).factoryID();
     const long instances = VPPlugInInstanceCount(factory);
-    plugin->Release();
-    plugin = nullptr;
+    plugin.release();
     EXPECT_EQ(VPPlugInInstanceCount(factory), instances);
 
     writeStore("XwCA", ct::makeXwCA({}).vec());

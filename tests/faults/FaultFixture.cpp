@@ -116,16 +116,14 @@ void FaultTest::open(Source source)
     releasePlugIn();
     VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"),
                              source == Source::Configuration ? kCFBooleanTrue : kCFBooleanFalse);
-    plugin_ = static_cast<VantishPlugIn*>(VantishPlugInFactory(kCFAllocatorDefault, kIOHIDServiceFilterPlugInTypeID));
-    plugin_->open(service_, 0);
+    plugin_.emplace();
+    (*plugin_)->open(service_, 0);
     VPDispatchDrain();
 }
 
 void FaultTest::releasePlugIn()
 {
-    if (plugin_)
-        plugin_->Release();
-    plugin_ = nullptr;
+    plugin_.reset();
     VPDispatchDrain();
 }
 
@@ -133,17 +131,15 @@ void FaultTest::rebuild(Source source)
 {
     VPServicePublishProperty(service_, CFSTR("SysConfigCalibration"),
                              source == Source::Configuration ? kCFBooleanTrue : kCFBooleanFalse);
-    plugin_->setPropertyForClient(CFSTR("RebuildVelderDB"), kCFBooleanTrue, nullptr);
+    (*plugin_)->setPropertyForClient(CFSTR("RebuildVelderDB"), kCFBooleanTrue, nullptr);
     VPDispatchDrain();
 }
 
 std::optional<unit::Chromaticity> FaultTest::colour()
 {
-    IOHIDEventRef event = unit::createEvent(unit::countsUnder(550.0));
-    plugin_->filter(event, false);
-    const auto colour = unit::colourOf(event).chromaticity();
-    CFRelease(event);
-    return colour;
+    const vt::Event event = unit::createEvent(unit::countsUnder(550.0));
+    (*plugin_)->filter(event.get(), false);
+    return unit::colourOf(event.get()).chromaticity();
 }
 
 bool FaultTest::colourFrom(const unit::Reference& reference)

@@ -3,8 +3,8 @@
 // writes from outside the plug-in.
 #pragma once
 
-#include "plugin/VantishPlugIn.h"
 #include "stress/SyntheticUnit.h"
+#include "support/PlugInHolder.h"
 #include "support/TestSupport.h"
 
 #include <gtest/gtest.h>
@@ -66,7 +66,7 @@ protected:
     } memoryTemporaryFolder_;
     vt::TempDir system_, state_, store_;
     IOHIDServiceRef service_ = nullptr;
-    VantishPlugIn* plugin_ = nullptr;
+    std::optional<vt::PlugIn> plugin_;
     vt::LogCapture log_{VPLogLevel::Info};
 };
 

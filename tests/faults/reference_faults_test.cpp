@@ -16,7 +16,7 @@ protected:
         FaultTest::SetUp();
         open(Source::Factory);
         ASSERT_TRUE(colourFrom(kSecondReference));
-        database_ = parts(*plugin_).databases().snapshot().db;
+        database_ = plugin_->parts().databases().snapshot().db;
         cache_ = cacheBytes();
         ASSERT_FALSE(cache_.empty());
     }
@@ -26,7 +26,7 @@ protected:
     {
         EXPECT_EQ(logged(cause), times);
         EXPECT_EQ(logged("Failed to rebuild databases."), times);
-        EXPECT_EQ(parts(*plugin_).databases().snapshot().db, database_) << "the database in use was replaced";
+        EXPECT_EQ(plugin_->parts().databases().snapshot().db, database_) << "the database in use was replaced";
         EXPECT_TRUE(colourFrom(kSecondReference));
         EXPECT_TRUE(cacheBytes() == cache_) << "the cache file changed";
     }

@@ -83,12 +83,12 @@ TEST_F(StoreAndServiceFaults, EmptyStoreOnDravikOS)
 TEST_F(StoreAndServiceFaults, StoreErrorOnARebuild)
 {
     open(Source::Factory);
-    const auto database = parts(*plugin_).databases().snapshot().db;
+    const auto database = plugin_->parts().databases().snapshot().db;
     VPQVTSetFailure("XwCA", kStoreError);
     VPQVTSetFailure("XwCl", kStoreError);
     rebuild(Source::Factory);
     EXPECT_EQ(logged("Failed to rebuild databases."), 1u);
-    EXPECT_EQ(parts(*plugin_).databases().snapshot().db, database);
+    EXPECT_EQ(plugin_->parts().databases().snapshot().db, database);
     EXPECT_TRUE(colourFrom(kSecondReference));
     EXPECT_TRUE(cacheBytes() == cache_) << "the cache file changed";
 }
@@ -113,7 +113,7 @@ TEST_F(StoreAndServiceFaults, DriverRefusesTheRegistryRecord)
     VPServiceRefuseProperty(service_, CFSTR("ALSCalibrationData"), true);
     open(Source::Configuration);
     EXPECT_EQ(logged("Failed to set ALS calibration data."), 1u);
-    EXPECT_EQ(parts(*plugin_).databases().snapshot().db, nullptr);
+    EXPECT_EQ(plugin_->parts().databases().snapshot().db, nullptr);
     EXPECT_FALSE(colour());
     EXPECT_TRUE(cacheBytes() == cache_) << "the cache file changed";
 }

@@ -1,6 +1,6 @@
 #include "stress/Host.h"
 
-#include "plugin/VantishPlugIn.h"
+#include "support/PlugInHolder.h"
 
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/HIDHost.h>
@@ -139,7 +139,7 @@ void Host::lifetime(unsigned number, unsigned events, unsigned rebuilds)
     if (storeEmpty)
         store_.empty();
 
-    plugin_ = VantishPlugInFactory(kCFAllocatorDefault, kIOHIDServiceFilterPlugInTypeID);
+    plugin_ = vt::createPlugIn();
     table_ = *static_cast<IOHIDServiceFilterPlugInInterface**>(plugin_);
     table_->open(plugin_, service, 0);
     overrideOn_ = false;
@@ -235,20 +235,18 @@ void Host::rebuild(IOHIDServiceRef service, bool configuration)
 
 void Host::filterOne()
 {
-    IOHIDEventRef event = unit::createEvent(counts_);
-    table_->filter(plugin_, event);
-    check(unit::colourOf(event), overrideOn_ ? Expect::Override : Expect::DatabaseOrNone, false);
-    CFRelease(event);
+    const vt::Event event = unit::createEvent(counts_);
+    table_->filter(plugin_, event.get());
+    check(unit::colourOf(event.get()), overrideOn_ ? Expect::Override : Expect::DatabaseOrNone, false);
     ++tally_.events;
 }
 
 // A copied event gets the last colour; the override applies once colour is on.
 void Host::copyOne()
 {
-    IOHIDEventRef event = IOHIDEventCreate(kCFAllocatorDefault, kIOHIDEventTypeAmbientLightSensor, 0, 0);
-    table_->filterCopyEvent(plugin_, event);
-    check(unit::colourOf(event), overrideOn_ ? Expect::OverrideOrNone : Expect::DatabaseOrNone, true);
-    CFRelease(event);
+    const vt::Event event = vt::createALSEvent(nullptr);
+    table_->filterCopyEvent(plugin_, event.get());
+    check(unit::colourOf(event.get()), overrideOn_ ? Expect::OverrideOrNone : Expect::DatabaseOrNone, true);
     ++tally_.copies;
 }
 

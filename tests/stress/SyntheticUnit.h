@@ -11,6 +11,7 @@
 // whole can never give. Header-only: both test programs include it.
 #pragma once
 
+#include "support/ALSEvents.h"
 #include "sysconfig/SysConfigFixture.h"
 
 #include <CoreFoundation/CoreFoundation.h>
@@ -23,7 +24,6 @@
 #include <cmath>
 #include <cstdint>
 #include <cstdlib>
-#include <cstring>
 #include <filesystem>
 #include <fstream>
 #include <optional>
@@ -203,23 +203,12 @@ inline std::vector<uint8_t> readFile(const std::filesystem::path& file)
 // ---- Events and the colour they come back with ------------------------------------------
 
 // An ALS event carrying the driver's 137-byte sample record.
-inline IOHIDEventRef createEvent(const std::array<float, kChannels>& counts, float lux = kLux)
+inline vt::Event createEvent(const std::array<float, kChannels>& counts, float lux = kLux)
 {
-    std::vector<uint8_t> record(137, 0);
-    putLE(record, 4, kChannels, 1);
-    uint32_t bits;
-    std::memcpy(&bits, &lux, 4);
-    putLE(record, 20, bits, 4);
-    for (unsigned c = 0; c < kChannels; ++c) {
-        std::memcpy(&bits, &counts[c], 4);
-        putLE(record, 28 + 4 * c, bits, 4);
-    }
-    IOHIDEventRef event = IOHIDEventCreate(kCFAllocatorDefault, kIOHIDEventTypeAmbientLightSensor, 0, 0);
-    IOHIDEventRef child = IOHIDEventCreateVendorDefinedEvent(kCFAllocatorDefault, 0, 0xFF00, 4, 0, record.data(),
-                                                             CFIndex(record.size()), 0);
-    IOHIDEventAppendEvent(event, child, 0);
-    CFRelease(child);
-    return event;
+    std::array<float, 6> channels{};
+    std::copy(counts.begin(), counts.end(), channels.begin());
+    const vt::Record record = vt::Record().sampleChannelCount(kChannels).lux(lux).channels(channels);
+    return vt::createALSEvent(&record);
 }
 
 struct EventColour {
@@ -236,13 +225,7 @@ struct EventColour {
     }
 };
 
-inline EventColour colourOf(IOHIDEventRef event)
-{
-    return {long(IOHIDEventGetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace)),
-            {IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent0),
-             IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent1),
-             IOHIDEventGetDoubleValue(event, kIOHIDEventFieldAmbientLightColorComponent2)}};
-}
+inline EventColour colourOf(IOHIDEventRef event) { return {long(vt::colourSpaceOf(event)), vt::eventXYZ(event)}; }
 
 // Distance in the chromaticity plane.
 inline double distance(Chromaticity a, Chromaticity b) { return std::hypot(a.x - b.x, a.y - b.y); }

@@ -4,7 +4,7 @@
 // the blobs. Header-only: the plug-in tests use it too.
 #pragma once
 
-#include "plugin/TestAccess.h"
+#include "support/PlugInHolder.h"
 #include "sysconfig/SysConfigCalibration.h"
 #include "support/TestSupport.h"
 
@@ -262,7 +262,6 @@ protected:
         parent_ = VPRegistryCreateEntry(kRegistryID - 1, 0);
         entry_ = VPRegistryCreateEntry(kRegistryID, parent_);
         service_ = VPServiceCreate(kRegistryID);
-        plugin_ = static_cast<VantishPlugIn*>(VantishPlugInFactory(nullptr, kIOHIDServiceFilterPlugInTypeID));
         parts(*plugin_).service() = service_;
         parts(*plugin_).registryEntry() = IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(kRegistryID));
         parts(*plugin_).unit().orientation = 1;
@@ -272,8 +271,7 @@ protected:
     void TearDown() override
     {
         VPDispatchDrain();
-        if (plugin_)
-            plugin_->Release();
+        plugin_.release();
         CFRelease(service_);
         VPRegistryReset();
     }
@@ -319,7 +317,7 @@ protected:
     vt::TempDir system_;
     io_registry_entry_t parent_ = 0, entry_ = 0;
     IOHIDServiceRef service_ = nullptr;
-    VantishPlugIn* plugin_ = nullptr;
+    vt::PlugIn plugin_;
 };
 
 } // namespace sctest

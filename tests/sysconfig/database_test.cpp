@@ -282,14 +282,13 @@ TEST_F(Database, QueuedWriteOutlivesTheHostsRelease)
 {
     vt::LogCapture log;
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
-    VantishPlugIn* plugin = std::exchange(plugin_, nullptr);
-    const CFUUIDRef factory = parts(*plugin).factoryID();
+    const CFUUIDRef factory = parts(*plugin_).factoryID();
     {
         // Holding the calibration lock keeps the queued task waiting.
-        const auto guard = parts(*plugin).calibration().lock();
-        EXPECT_TRUE(processSysConfigCalibration(parts(*plugin).calibration(), true, true, true));
-        EXPECT_EQ(parts(*plugin).refCount(), 2u); // the task holds the instance
-        plugin->Release();                       // the host lets go
+        const auto guard = parts(*plugin_).calibration().lock();
+        EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, true));
+        EXPECT_EQ(parts(*plugin_).refCount(), 2u); // the task holds the instance
+        plugin_.release(); // the host lets go
     }
     VPDispatchDrain();
     EXPECT_TRUE(log.contains("Small DB has been created\n"));
