@@ -62,14 +62,14 @@ void parseXwCAT2(VantishPlugIn& p, CFDataRef data)
 void parseXwCl(VantishPlugIn& p, CFDataRef data)
 {
     const std::span<const uint8_t> bytes(CFDataGetBytePtr(data), size_t(CFDataGetLength(data)));
-    const calib::XwClParse parsed = calib::parseXwClRecord(p, bytes);
+    const calib::XwClParse parsed = calib::parseXwClRecord(parts(p).calibration(), bytes);
     if (parsed.outcome != calib::XwClParse::Outcome::Record)
         return;
     if (!parsed.record)
         std::abort();
     Matrices m;
     prepareColumns(p, m);
-    checkExtracted(p, m, calib::extractXwClSpectrum(p, bytes, parsed.entryOffset, m));
+    checkExtracted(p, m, calib::extractXwClSpectrum(parts(p).calibration(), bytes, parsed.entryOffset, m));
 }
 
 void parseVD6287v3(VantishPlugIn& p, CFDataRef data)

@@ -15,6 +15,7 @@
 #include "support/FuzzSupport.h"
 
 #include "support/CFOwned.h"
+#include "sysconfig/SysConfigCalibration.h"
 
 #include <IOKit/IOKitLib.h>
 #include <VantishPlatform/HIDHost.h>
