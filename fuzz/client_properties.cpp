@@ -18,11 +18,10 @@
 //   byte, then key and value for each), nested at most 4 deep.
 #include "support/FuzzSupport.h"
 
+#include "support/ALSEvents.h"
 #include "support/CFOwned.h"
 
 #include <VantishPlatform/HIDHost.h>
-
-#include <IOKit/hid/IOHIDEvent.h>
 
 #include <array>
 #include <string>
@@ -107,19 +106,10 @@ CFStringRef key(fz::Input& in)
 }
 
 // An ALS event with a plain sample record of four lit channels.
-IOHIDEventRef createEvent()
+vt::Event createEvent()
 {
-    std::array<uint8_t, 137> record{};
-    const std::array<float, 6> channels = {120.0f, 200.0f, 90.0f, 400.0f, 50.0f, 10.0f};
-    std::memcpy(record.data() + 28, channels.data(), sizeof channels);
-    const float lux = 150.0f;
-    std::memcpy(record.data() + 20, &lux, sizeof lux);
-    IOHIDEventRef event = IOHIDEventCreate(kCFAllocatorDefault, kIOHIDEventTypeAmbientLightSensor, 1000, 0);
-    IOHIDEventRef child = IOHIDEventCreateVendorDefinedEvent(kCFAllocatorDefault, 1000, 0xFF00, 4, 0, record.data(),
-                                                             CFIndex(record.size()), 0);
-    IOHIDEventAppendEvent(event, child, 0);
-    CFRelease(child);
-    return event;
+    const vt::Record record = vt::Record().channels({120.0f, 200.0f, 90.0f, 400.0f, 50.0f, 10.0f}).lux(150.0f);
+    return vt::createALSEvent(&record, 1000);
 }
 
 } // namespace
@@ -135,7 +125,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
     if (serviceFlags & 1)
         VPServicePublishProperty(service, CFSTR("SysConfigCalibration"), kCFBooleanTrue);
     {
-        fz::PlugIn plugin;
+        vt::PlugIn plugin(vt::PlugIn::AtRelease::RunQueuedWorkFirst);
         parts(*plugin).service() = service;
         parts(*plugin).unit().numberOfChannels = dbChannels;
         parts(*plugin).unit().dbChannelCount = dbChannels;
@@ -147,9 +137,9 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
             VantishPlugIn::setPropertyForClient(&*plugin, k.get(), v.get(), nullptr);
         }
 
-        CFOwned<IOHIDEventRef> event(createEvent());
+        const vt::Event event = createEvent();
         VantishPlugIn::filter(&*plugin, event.get());
-        CFOwned<IOHIDEventRef> copy(createEvent());
+        const vt::Event copy = createEvent();
         VantishPlugIn::filterCopyEvent(&*plugin, copy.get());
     }
     CFRelease(service);

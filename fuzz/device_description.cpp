@@ -55,10 +55,10 @@ std::optional<host::DeviceDescription> parse(const uint8_t* data, size_t size)
 
 void runPlugIn(IOHIDServiceRef service)
 {
-    fz::PlugIn plugin;
+    vt::PlugIn plugin(vt::PlugIn::AtRelease::RunQueuedWorkFirst);
     VantishPlugIn::match(&*plugin, service, 0);
     VantishPlugIn::open(&*plugin, service, 0);
-    fz::runQueuedWork();
+    vt::runQueuedWork();
 
     ALSSampleRecord record;
     record.lux = 120.0f;

@@ -101,7 +101,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
     const uint8_t layout = input.take<uint8_t>();
     const uint8_t chipType = input.take<uint8_t>();
 
-    fz::PlugIn plugin;
+    vt::PlugIn plugin(vt::PlugIn::AtRelease::RunQueuedWorkFirst);
     parts(*plugin).unit().chipId = fz::kChipId;
     parts(*plugin).unit().chipType = chipType % 4;
 

@@ -86,9 +86,9 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
     }
 
     {
-        fz::PlugIn plugin;
+        vt::PlugIn plugin(vt::PlugIn::AtRelease::RunQueuedWorkFirst);
         plugin->open(service, 0);
-        fz::runQueuedWork();
+        vt::runQueuedWork();
         if (flags & kLoadAgain)
             parts(*plugin).calibration().loadQVTCalibration(false);
         if (flags & kClientRebuild)

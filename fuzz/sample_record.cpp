@@ -16,11 +16,7 @@
 //   rest     the record
 #include "support/FuzzSupport.h"
 
-#include "support/CFOwned.h"
-
-#include <IOKit/hid/IOHIDEvent.h>
-
-#include <memory>
+#include "support/ALSEvents.h"
 
 namespace {
 
@@ -35,21 +31,6 @@ enum Flags : uint8_t {
     kNotReady = 1 << 7,
 };
 
-IOHIDEventRef createEvent(bool als, bool withRecord, std::span<const uint8_t> record, uint64_t timeStamp)
-{
-    IOHIDEventRef event = IOHIDEventCreate(
-        kCFAllocatorDefault, als ? kIOHIDEventTypeAmbientLightSensor : kIOHIDEventTypeVendorDefined, timeStamp, 0);
-    if (withRecord) {
-        IOHIDEventRef child = IOHIDEventCreateVendorDefinedEvent(kCFAllocatorDefault, timeStamp, 0xFF00, 4, 0,
-                                                                 record.data(), CFIndex(record.size()), 0);
-        if (child) {
-            IOHIDEventAppendEvent(event, child, 0);
-            CFRelease(child);
-        }
-    }
-    return event;
-}
-
 } // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
@@ -63,7 +44,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
     const uint8_t chipType = input.take<uint8_t>();
     const uint8_t mitigationType = input.take<uint8_t>();
 
-    fz::PlugIn plugin;
+    vt::PlugIn plugin(vt::PlugIn::AtRelease::RunQueuedWorkFirst);
     parts(*plugin).unit().numberOfChannels = channels;
     parts(*plugin).unit().dbChannelCount = dbChannels;
     parts(*plugin).unit().sensorType = sensorType;
@@ -82,11 +63,12 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
     const uint64_t timeStamp = input.take<uint64_t>();
     parts(*plugin).databases().publish(fz::smallDatabase(dbChannels, flags & kNormalised), !(flags & kNotReady));
 
-    const bool als = !(flags & kNotALS);
-    const bool withRecord = !(flags & kNoRecord);
-    CFOwned<IOHIDEventRef> event(createEvent(als, withRecord, input.rest(), timeStamp));
+    const IOHIDEventType type = flags & kNotALS ? kIOHIDEventTypeVendorDefined : kIOHIDEventTypeAmbientLightSensor;
+    const vt::Record record(input.rest());
+    const vt::Record* child = flags & kNoRecord ? nullptr : &record;
+    const vt::Event event = vt::createEvent(type, child, timeStamp);
     plugin->filter(event.get(), false);
-    CFOwned<IOHIDEventRef> copy(createEvent(als, withRecord, input.rest(), timeStamp));
+    const vt::Event copy = vt::createEvent(type, child, timeStamp);
     plugin->filterCopyEvent(copy.get());
     plugin->logALSSample(copy.get(), true);
     return 0;

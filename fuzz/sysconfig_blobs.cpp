@@ -73,7 +73,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
 
     IOHIDServiceRef service = VPServiceCreate(kRegistryID);
     {
-        fz::PlugIn plugin;
+        vt::PlugIn plugin(vt::PlugIn::AtRelease::RunQueuedWorkFirst);
         parts(*plugin).service() = service;
         parts(*plugin).registryEntry() =
             IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(kRegistryID));
@@ -86,7 +86,7 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
         const bool push = flags & kPushCalibration;
         const bool database = flags & kProcessDatabase;
         processSysConfigCalibration(parts(*plugin).calibration(), async, push, database);
-        fz::runQueuedWork();
+        vt::runQueuedWork();
         if (flags & kCalibrateTwice)
             processSysConfigCalibration(parts(*plugin).calibration(), async, push, database);
     }

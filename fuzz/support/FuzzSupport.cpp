@@ -1,6 +1,5 @@
 #include "support/FuzzSupport.h"
 
-#include <IOKit/hid/IOHIDServiceFilterPlugIn.h>
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/DispatchControl.h>
 #include <VantishPlatform/LogControl.h>
@@ -126,26 +125,6 @@ void writeFile(const fs::path& file, std::span<const uint8_t> bytes)
 {
     std::ofstream out(file, std::ios::binary | std::ios::trunc);
     out.write(reinterpret_cast<const char*>(bytes.data()), std::streamsize(bytes.size()));
-}
-
-PlugIn::PlugIn()
-    : p_(static_cast<VantishPlugIn*>(VantishPlugInFactory(kCFAllocatorDefault, kIOHIDServiceFilterPlugInTypeID)))
-{
-    if (!p_)
-        std::abort();
-}
-
-PlugIn::~PlugIn()
-{
-    runQueuedWork();
-    p_->Release();
-}
-
-void runQueuedWork()
-{
-    do
-        VPDispatchDrain();
-    while (VPDispatchFireDelayed() != 0);
 }
 
 CFDataRef createData(std::span<const uint8_t> bytes)

@@ -1,13 +1,15 @@
 // What every fuzz target shares: a private workspace on a memory file system
 // (device paths mapped into it, a small reference database, an empty state
-// folder and factory store), quiet logging, one plug-in instance per input,
-// and a reader that takes option bytes from the front of an input.
+// folder and factory store), quiet logging, and a reader that takes option
+// bytes from the front of an input. Each input gets its own plug-in instance
+// (vt::PlugIn, with AtRelease::RunQueuedWorkFirst, from tests/support).
 //
 // Every input starts from the same state: no cache file, no store record, no
 // queued work left over from the input before.
 #pragma once
 
 #include "plugin/VantishPlugIn.h"
+#include "support/PlugInHolder.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -86,24 +88,6 @@ public:
 private:
     std::span<const uint8_t> bytes_;
 };
-
-// A plug-in instance from the factory. On destruction, queued and delayed
-// work runs to its end first, then the host's Release.
-class PlugIn {
-public:
-    PlugIn();
-    ~PlugIn();
-    PlugIn(const PlugIn&) = delete;
-    PlugIn& operator=(const PlugIn&) = delete;
-    VantishPlugIn* operator->() const { return p_; }
-    VantishPlugIn& operator*() const { return *p_; }
-
-private:
-    VantishPlugIn* p_;
-};
-
-// Runs all queued and delayed work until none is left.
-void runQueuedWork();
 
 CFDataRef createData(std::span<const uint8_t> bytes);
 
