@@ -16,9 +16,9 @@
 //   9 a string (length byte, bytes)   10 data (length byte, bytes)
 //   11 an array (count byte, then that many values), 12 a dictionary (count
 //   byte, then key and value for each), nested at most 4 deep.
-#include "support/FuzzSupport.h"
+#include "common/FuzzSupport.h"
 
-#include "support/ALSEvents.h"
+#include "common/ALSEvents.h"
 #include "support/CFOwned.h"
 
 #include <VantishPlatform/HIDHost.h>

@@ -6,8 +6,8 @@
 //
 // Input: the JSON text. Values may read files only inside the description's
 // folder, which holds the files of data/devices/*/ and "blob.bin".
-#include "support/FuzzSupport.h"
-#include "support/PlainFiles.h"
+#include "common/FuzzSupport.h"
+#include "common/PlainFiles.h"
 
 #include "host/emulator/DeviceDescription.h"
 #include "host/emulator/DriverSample.h"

@@ -5,8 +5,8 @@
 //
 // Input: byte 0 = bit 0 JSON lines (else CSV); byte 1 = the unit's channel
 // count; the rest is the text.
-#include "support/FuzzSupport.h"
-#include "support/PlainFiles.h"
+#include "common/FuzzSupport.h"
+#include "common/PlainFiles.h"
 
 #include "host/emulator/DeviceDescription.h"
 #include "host/emulator/DriverSample.h"

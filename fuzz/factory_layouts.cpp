@@ -8,7 +8,7 @@
 // parser); byte 1 the chip type the plug-in has (XwCl spectra fold channel 0
 // for types 1 and 2); the rest is the record, zero-padded or cut to the
 // layout's exact size (XwCl: two entries when longer than one).
-#include "support/FuzzSupport.h"
+#include "common/FuzzSupport.h"
 
 #include "support/CFOwned.h"
 #include "calibration/SpectrumExtraction.h"

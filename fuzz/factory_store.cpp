@@ -11,7 +11,7 @@
 // given, 1 XwCA T2, 2 XwCl one entry, 3 XwCl two entries, 4 VD6287 v1,
 // 5 VD6287 v3); byte 2 = the service's "NumberOfChannels"; byte 3 = its
 // "ALSSensorType"; the rest is the record.
-#include "support/FuzzSupport.h"
+#include "common/FuzzSupport.h"
 
 #include "support/CFOwned.h"
 #include "formats/VD6287Layout.h"

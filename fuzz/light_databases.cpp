@@ -16,7 +16,7 @@
 // Files not named keep the workspace's reference databases (6 sources of 16
 // samples) and no cache.
 // Values are bound as text, so every statement stays a plain insert.
-#include "support/FuzzSupport.h"
+#include "common/FuzzSupport.h"
 
 #include "lightdb/CachedDB.h"
 #include "lightdb/LDBM.h"

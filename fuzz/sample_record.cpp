@@ -14,9 +14,9 @@
 //   6 x u32  RGBC override values  3 x f64 chromaticity override x, y, Y
 //   f32      lambda                u64     event time stamp
 //   rest     the record
-#include "support/FuzzSupport.h"
+#include "common/FuzzSupport.h"
 
-#include "support/ALSEvents.h"
+#include "common/ALSEvents.h"
 
 namespace {
 

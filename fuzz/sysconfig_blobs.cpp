@@ -12,7 +12,7 @@
 // byte 2 = numberOfChannels before calibration; bytes 3-4 = length L of
 // "alsCalibration" (little-endian); then L bytes of it; the rest is
 // "alsAuxCalibration".
-#include "support/FuzzSupport.h"
+#include "common/FuzzSupport.h"
 
 #include "support/CFOwned.h"
 #include "sysconfig/SysConfigCalibration.h"

@@ -11,7 +11,7 @@
 #include "formats/VD6287Layout.h"
 #include "formats/XwCAT2Layout.h"
 #include "formats/XwClLayout.h"
-#include "fuzz/support/FuzzSupport.h"
+#include "fuzz/common/FuzzSupport.h"
 
 #include <nlohmann/json.hpp>
 #include <sqlite3.h>

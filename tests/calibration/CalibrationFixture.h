@@ -3,8 +3,8 @@
 // service with a factory store, and a small reference database.
 #pragma once
 
-#include "support/PlugInHolder.h"
-#include "support/TestSupport.h"
+#include "common/PlugInHolder.h"
+#include "common/TestSupport.h"
 
 #include <CoreFoundation/CoreFoundation.h>
 #include <VantishPlatform/DeviceState.h>

@@ -5,7 +5,7 @@
 #include "colour/MatrixUtilities.h"
 #include "colour/SimdLevel.h"
 #include "colour/Solvers.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 

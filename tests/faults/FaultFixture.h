@@ -4,8 +4,8 @@
 #pragma once
 
 #include "stress/SyntheticUnit.h"
-#include "support/PlugInHolder.h"
-#include "support/TestSupport.h"
+#include "common/PlugInHolder.h"
+#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 #include <sqlite3.h>

@@ -1,6 +1,6 @@
 // Loading the plug-in bundle through its registration, as the event system does.
 #include "host/emulator/Bundle.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 

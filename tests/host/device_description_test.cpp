@@ -7,7 +7,7 @@
 // file may be gone by then.
 #include "host/emulator/DeviceDescription.h"
 #include "host/emulator/Unit.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 

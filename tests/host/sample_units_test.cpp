@@ -10,7 +10,7 @@
 #include "spectra/CieIlluminants.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
 

@@ -16,7 +16,7 @@
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
 #include "spectra/TestLights.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
 

@@ -5,7 +5,7 @@
 #include "spectra/CieIlluminants.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/Planck.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 

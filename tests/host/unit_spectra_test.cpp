@@ -8,7 +8,7 @@
 #include "host/recordcodec/RecordCodec.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
 

@@ -5,7 +5,7 @@
 #include "ReportXml.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/TestLights.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 

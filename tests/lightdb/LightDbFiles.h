@@ -3,7 +3,7 @@
 #pragma once
 
 #include "lightdb/LDBMInfo.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 

@@ -1,5 +1,5 @@
 #include "CFOwned.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <QVT/QVT.h>
 #include <Tessary/Tessary.h>

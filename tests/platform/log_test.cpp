@@ -1,5 +1,5 @@
 #include "CFOwned.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/LogControl.h>
 #include <os/log.h>

@@ -3,8 +3,8 @@
 #pragma once
 
 #include "plugin/TestAccess.h"
-#include "support/ALSEvents.h"
-#include "support/PlugInHolder.h"
+#include "common/ALSEvents.h"
+#include "common/PlugInHolder.h"
 
 #include <array>
 #include <cstdint>

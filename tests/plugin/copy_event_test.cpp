@@ -1,7 +1,7 @@
 // Events copied by clients: colour from the last filtered sample, the
 // chromaticity override, and the VD6287 path through the whole filter.
 #include "PlugInState.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
 

@@ -2,7 +2,7 @@
 // linear database.
 #include "PlugInState.h"
 
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 

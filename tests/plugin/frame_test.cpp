@@ -2,7 +2,7 @@
 // reference counting, and the log handles.
 #include "support/Log.h"
 #include "plugin/TestAccess.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/DispatchControl.h>

@@ -1,6 +1,6 @@
 // Matching services and reading the configuration at open.
-#include "support/PlugInHolder.h"
-#include "support/TestSupport.h"
+#include "common/PlugInHolder.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/DispatchControl.h>

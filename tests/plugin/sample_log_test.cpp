@@ -1,7 +1,7 @@
 // The per-event log line of VD6287 services, compared character for character.
 #include "PlugInState.h"
 
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 

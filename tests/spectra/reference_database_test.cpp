@@ -4,7 +4,7 @@
 #include "spectra/ReferenceDatabase.h"
 
 #include "lightdb/LDBM.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/Paths.h>
 #include <gtest/gtest.h>

@@ -2,7 +2,7 @@
 // sensors with near-infrared leakage, and malformed files are refused with
 // the line at fault.
 #include "spectra/SensorModel.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 

@@ -1,6 +1,6 @@
 #include "stress/Host.h"
 
-#include "support/PlugInHolder.h"
+#include "common/PlugInHolder.h"
 
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/HIDHost.h>

@@ -11,7 +11,7 @@
 // whole can never give. Header-only: both test programs include it.
 #pragma once
 
-#include "support/ALSEvents.h"
+#include "common/ALSEvents.h"
 #include "sysconfig/SysConfigFixture.h"
 
 #include <CoreFoundation/CoreFoundation.h>

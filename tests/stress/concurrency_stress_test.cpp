@@ -10,7 +10,7 @@
 // filtered events, 72 rebuilds, 48 instance lifetimes); the default, 0.04,
 // keeps the ordinary test run to about a second.
 #include "stress/Host.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/DispatchControl.h>

@@ -4,9 +4,9 @@
 // the blobs. Header-only: the plug-in tests use it too.
 #pragma once
 
-#include "support/PlugInHolder.h"
+#include "common/PlugInHolder.h"
 #include "sysconfig/SysConfigCalibration.h"
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
 #include <VantishPlatform/HIDHost.h>

@@ -1,4 +1,4 @@
-#include "support/FuzzSupport.h"
+#include "common/FuzzSupport.h"
 
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/DispatchControl.h>

@@ -1,4 +1,4 @@
-#include "support/ALSEvents.h"
+#include "common/ALSEvents.h"
 
 namespace vt {
 

@@ -1,4 +1,4 @@
-#include "support/TestSupport.h"
+#include "common/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
 #include <VantishPlatform/Paths.h>

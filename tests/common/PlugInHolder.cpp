@@ -1,4 +1,4 @@
-#include "support/PlugInHolder.h"
+#include "common/PlugInHolder.h"
 
 #include <IOKit/hid/IOHIDServiceFilterPlugIn.h>
 #include <VantishPlatform/DispatchControl.h>

@@ -2,14 +2,14 @@
 // (device paths mapped into it, a small reference database, an empty state
 // folder and factory store), quiet logging, and a reader that takes option
 // bytes from the front of an input. Each input gets its own plug-in instance
-// (vt::PlugIn, with AtRelease::RunQueuedWorkFirst, from tests/support).
+// (vt::PlugIn, with AtRelease::RunQueuedWorkFirst, from tests/common).
 //
 // Every input starts from the same state: no cache file, no store record, no
 // queued work left over from the input before.
 #pragma once
 
 #include "plugin/VantishPlugIn.h"
-#include "support/PlugInHolder.h"
+#include "common/PlugInHolder.h"
 
 #include <cstddef>
 #include <cstdint>
