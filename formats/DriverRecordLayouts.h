@@ -11,7 +11,6 @@
 
 namespace driver {
 
-
 inline constexpr uint8_t kRecordVersion = 1;
 inline constexpr uint8_t kCalibrationVersion = 1;
 // Gain values per channel block.
@@ -55,29 +54,61 @@ struct ChannelRecordLayout {
     size_t size;
     unsigned maxChannels;
     bool hasAux3;
-    size_t aux3;         // u16, when hasAux3
-    size_t gain;         // u8[gainSlots]
+    size_t aux3; // u16, when hasAux3
+    size_t gain; // u8[gainSlots]
     unsigned gainSlots;
-    size_t nChannels;    // u8
-    size_t nGains;       // u8
-    bool fixedLux;       // luxCoeff as i32 with 16 fraction bits and cctCoeff as two raw words
-    size_t luxCoeff;     // i32[maxChannels] (fixedLux) or f32[maxChannels]
-    size_t cctCoeff;     // u32[2] (fixedLux) or f32[maxChannels]
-    size_t blocks;       // first channel block
+    size_t nChannels; // u8
+    size_t nGains;    // u8
+    bool fixedLux;    // luxCoeff as i32 with 16 fraction bits and cctCoeff as two raw words
+    size_t luxCoeff;  // i32[maxChannels] (fixedLux) or f32[maxChannels]
+    size_t cctCoeff;  // u32[2] (fixedLux) or f32[maxChannels]
+    size_t blocks;    // first channel block
     ChannelBlockLayout block;
 
     size_t blockOffset(unsigned channel) const { return blocks + block.size * channel; }
 };
 
-inline constexpr ChannelRecordLayout kFourChannelRecord{
-    .size = 145, .maxChannels = 4, .hasAux3 = false, .aux3 = 0, .gain = 20, .gainSlots = 3, .nChannels = 23,
-    .nGains = 24, .fixedLux = true, .luxCoeff = 25, .cctCoeff = 41, .blocks = 49, .block = kNarrowBlock};
-inline constexpr ChannelRecordLayout kFiveChannelRecord{
-    .size = 193, .maxChannels = 5, .hasAux3 = true, .aux3 = 20, .gain = 22, .gainSlots = 4, .nChannels = 26,
-    .nGains = 27, .fixedLux = false, .luxCoeff = 28, .cctCoeff = 48, .blocks = 68, .block = kWideBlock};
-inline constexpr ChannelRecordLayout kSixChannelRecord{
-    .size = 220, .maxChannels = 6, .hasAux3 = true, .aux3 = 20, .gain = 22, .gainSlots = 4, .nChannels = 26,
-    .nGains = 27, .fixedLux = false, .luxCoeff = 28, .cctCoeff = 52, .blocks = 76, .block = kNarrowBlock};
+// clang-format off: one record per line pair, fields in layout order
+inline constexpr ChannelRecordLayout kFourChannelRecord{.size = 145,
+                                                        .maxChannels = 4,
+                                                        .hasAux3 = false,
+                                                        .aux3 = 0,
+                                                        .gain = 20,
+                                                        .gainSlots = 3,
+                                                        .nChannels = 23,
+                                                        .nGains = 24,
+                                                        .fixedLux = true,
+                                                        .luxCoeff = 25,
+                                                        .cctCoeff = 41,
+                                                        .blocks = 49,
+                                                        .block = kNarrowBlock};
+inline constexpr ChannelRecordLayout kFiveChannelRecord{.size = 193,
+                                                        .maxChannels = 5,
+                                                        .hasAux3 = true,
+                                                        .aux3 = 20,
+                                                        .gain = 22,
+                                                        .gainSlots = 4,
+                                                        .nChannels = 26,
+                                                        .nGains = 27,
+                                                        .fixedLux = false,
+                                                        .luxCoeff = 28,
+                                                        .cctCoeff = 48,
+                                                        .blocks = 68,
+                                                        .block = kWideBlock};
+inline constexpr ChannelRecordLayout kSixChannelRecord{.size = 220,
+                                                       .maxChannels = 6,
+                                                       .hasAux3 = true,
+                                                       .aux3 = 20,
+                                                       .gain = 22,
+                                                       .gainSlots = 4,
+                                                       .nChannels = 26,
+                                                       .nGains = 27,
+                                                       .fixedLux = false,
+                                                       .luxCoeff = 28,
+                                                       .cctCoeff = 52,
+                                                       .blocks = 76,
+                                                       .block = kNarrowBlock};
+// clang-format on
 
 // The VD6287 record: two halves, one per calibration blob of the factory record.
 namespace vd6287 {
@@ -87,12 +118,12 @@ inline constexpr unsigned kChannels = 5;
 inline constexpr unsigned kGainTableSize = 10; // 1, 2, 4, then seven calibrated steps
 inline constexpr unsigned kTableEntries = 7;
 // Offsets within a half (j = channel, m = table entry).
-inline constexpr size_t nChannels = 0;       // u8
-inline constexpr size_t gain = 2;            // u8, blob gain index + 2
-inline constexpr size_t blobWord = 4;        // u32
-inline constexpr size_t valueA = 8;          // f32, blob value / 100
-inline constexpr size_t valueB = 12;         // f32, blob value / 16384
-inline constexpr size_t gainTable = 16;      // f32[10] per channel, + 40 j
+inline constexpr size_t nChannels = 0;  // u8
+inline constexpr size_t gain = 2;       // u8, blob gain index + 2
+inline constexpr size_t blobWord = 4;   // u32
+inline constexpr size_t valueA = 8;     // f32, blob value / 100
+inline constexpr size_t valueB = 12;    // f32, blob value / 16384
+inline constexpr size_t gainTable = 16; // f32[10] per channel, + 40 j
 inline constexpr size_t gainTableStride = 40;
 inline constexpr size_t channelByte = 216;   // u8, + j
 inline constexpr size_t channelFactor = 224; // f32, + 4 j
