@@ -55,8 +55,7 @@ void* calloc(size_t count, size_t size)
 void* realloc(void* p, size_t size) { return __libc_realloc(p, size); }
 void free(void* p) { __libc_free(p); }
 
-void dgesv_(const int* n, const int* nrhs, double* a, const int* lda, int* ipiv, double* b, const int* ldb,
-            int* info);
+void dgesv_(const int* n, const int* nrhs, double* a, const int* lda, int* ipiv, double* b, const int* ldb, int* info);
 }
 
 namespace {
@@ -154,7 +153,7 @@ void baselineColour(const SpectralDatabase& db, const float* channels, double* x
     std::vector<double> x(channels, channels + M);
     auto sigma = [&](int j) {
         return normalised && !db.channelStdDev.empty() && db.channelStdDev[j] != 0.0f ? double(db.channelStdDev[j])
-                                                                                       : 1.0;
+                                                                                      : 1.0;
     };
     if (normalised) {
         double length = 0.0;
@@ -208,8 +207,7 @@ void baselineColour(const SpectralDatabase& db, const float* channels, double* x
 
 void reportHeapCalls(benchmark::State& state, long before)
 {
-    state.counters["heap/call"] =
-        benchmark::Counter(double(heapCalls.load() - before) / double(state.iterations()));
+    state.counters["heap/call"] = benchmark::Counter(double(heapCalls.load() - before) / double(state.iterations()));
 }
 
 void BM_Colour(benchmark::State& state, Mode mode)

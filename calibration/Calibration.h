@@ -109,7 +109,7 @@ private:
     FitParameters& fit_;
     DatabaseSlot& databases_;
     std::recursive_mutex mutex_;
-    int depth_ = 0;                          // guarded by mutex_
-    std::atomic<std::thread::id> owner_{};   // the thread holding mutex_, if any
+    int depth_ = 0;                        // guarded by mutex_
+    std::atomic<std::thread::id> owner_{}; // the thread holding mutex_, if any
     std::atomic<uint32_t> qvtRetryCount_{0};
 };

@@ -11,8 +11,7 @@ CFDataRef createColorCalibrationRecord(const SpectralDatabase& db, uint32_t chan
     const size_t n = db.dbSampleCount;
     const size_t responses = n * db.dbChannelCount;
     if (channelCount != db.dbChannelCount) {
-        VLOG_ERROR("ALSColorCalibration skipped: %u channels, the database has %u\n", channelCount,
-                   db.dbChannelCount);
+        VLOG_ERROR("ALSColorCalibration skipped: %u channels, the database has %u\n", channelCount, db.dbChannelCount);
         return nullptr;
     }
     if (n > layout::kMaxSamples || responses > layout::responseSlots || db.dbXYZ.size() < 3 * n ||

@@ -1,7 +1,7 @@
 // The built-in calibration the driver gets when the unit's own cannot be used.
-#include "support/CFOwned.h"
-#include "calibration/DriverRecords.h"
 #include "calibration/Calibration.h"
+#include "calibration/DriverRecords.h"
+#include "support/CFOwned.h"
 #include "support/Log.h"
 
 #include <optional>

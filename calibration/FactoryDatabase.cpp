@@ -1,6 +1,6 @@
 #include "calibration/FactoryDatabase.h"
 
-#include "support/CFOwned.h"
+#include "calibration/Calibration.h"
 #include "calibration/ColorCalibrationRecord.h"
 #include "calibration/SpectrumExtraction.h"
 #include "colour/MatrixUtilities.h"
@@ -9,8 +9,8 @@
 #include "formats/XwClLayout.h"
 #include "lightdb/CachedDB.h"
 #include "lightdb/LDBM.h"
-#include "calibration/Calibration.h"
 #include "support/Assert.h"
+#include "support/CFOwned.h"
 #include "support/Log.h"
 
 #include <memory>
@@ -40,8 +40,8 @@ bool extractSpectrum(Calibration& p, const FactorySource& source, Matrices& m)
     case FactoryLayout::XwCAT2:
         return p.processQVTSpectrumXwCAT2(data, m);
     case FactoryLayout::XwCl:
-        return extractXwClSpectrum(p, {CFDataGetBytePtr(data), size_t(CFDataGetLength(data))},
-                                   source.xwclEntryOffset, m);
+        return extractXwClSpectrum(p, {CFDataGetBytePtr(data), size_t(CFDataGetLength(data))}, source.xwclEntryOffset,
+                                   m);
     case FactoryLayout::None:
         break;
     }

@@ -3,8 +3,8 @@
 // normalised for the colour solver and then published whole.
 #pragma once
 
-#include "lightdb/LDBMInfo.h"
 #include "calibration/Calibration.h"
+#include "lightdb/LDBMInfo.h"
 
 #include <CoreFoundation/CoreFoundation.h>
 

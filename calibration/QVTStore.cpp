@@ -1,11 +1,11 @@
 // Calibration from the factory-data store: reading the record (with retries
 // while the store is not ready on Dravik OS), recognising and parsing it into
 // the driver record, and then the per-chip database.
-#include "support/CFOwned.h"
-#include "calibration/FactoryDatabase.h"
-#include "formats/VD6287Layout.h"
-#include "calibration/XwClFormat.h"
 #include "calibration/Calibration.h"
+#include "calibration/FactoryDatabase.h"
+#include "calibration/XwClFormat.h"
+#include "formats/VD6287Layout.h"
+#include "support/CFOwned.h"
 #include "support/Log.h"
 
 #include <QVT/QVT.h>
@@ -66,8 +66,7 @@ void Calibration::scheduleStoreRetry()
     const uint32_t failed = qvtRetryCount_.fetch_add(1);
     if (failed >= kStoreRetries)
         return;
-    VLOG_INFO("Retrieving QVT calibration data failed in attempt number %d/20. Try again in 5 sec.\n",
-              int(failed + 1));
+    VLOG_INFO("Retrieving QVT calibration data failed in attempt number %d/20. Try again in 5 sec.\n", int(failed + 1));
     host_.dispatchAfterRetained(dispatch_time(DISPATCH_TIME_NOW, kStoreRetryDelay),
                                 dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_HIGH, 0),
                                 [this] { loadQVTCalibration(false); });
@@ -127,7 +126,8 @@ bool Calibration::loadQVTCalibration(bool forceRebuild)
         VLOG_ERROR("Failed to parse ALS calibration data.");
         return false;
     }
-    if (host_.service() && !IOHIDServiceSetProperty(host_.service(), CFSTR("ALSCalibrationData"), parsed.record.get())) {
+    if (host_.service() &&
+        !IOHIDServiceSetProperty(host_.service(), CFSTR("ALSCalibrationData"), parsed.record.get())) {
         VLOG_ERROR("Failed to set ALS calibration data.");
         return false;
     }

@@ -1,11 +1,11 @@
 #include "calibration/SpectrumExtraction.h"
 
+#include "calibration/Calibration.h"
 #include "formats/VD6287Layout.h"
 #include "formats/XwCAT2Layout.h"
 #include "formats/XwClLayout.h"
-#include "calibration/Calibration.h"
-#include "support/Log.h"
 #include "support/LittleEndian.h"
+#include "support/Log.h"
 
 namespace calib {
 namespace {
@@ -74,9 +74,11 @@ bool fill(Calibration& p, Matrices& m, const StoredSpectra& sp, bool fold, bool 
     m.irCoefficients.clear();
 
     if (infoLog)
-        VLOG_INFO("Algo version: %d NSamples: %u\n", int(p.unit().algoVersion.load()), p.unit().spectrumSampleCount.load());
+        VLOG_INFO("Algo version: %d NSamples: %u\n", int(p.unit().algoVersion.load()),
+                  p.unit().spectrumSampleCount.load());
     else
-        VLOG_DEFAULT("Algo version: %d NSamples: %u\n", int(p.unit().algoVersion.load()), p.unit().spectrumSampleCount.load());
+        VLOG_DEFAULT("Algo version: %d NSamples: %u\n", int(p.unit().algoVersion.load()),
+                     p.unit().spectrumSampleCount.load());
     return true;
 }
 

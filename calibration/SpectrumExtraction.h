@@ -4,8 +4,8 @@
 // used.
 #pragma once
 
-#include "lightdb/Matrices.h"
 #include "calibration/Calibration.h"
+#include "lightdb/Matrices.h"
 
 #include <cstddef>
 #include <cstdint>
@@ -16,6 +16,7 @@ namespace calib {
 // Fills the spectra, weights and tail settings of `matrices` (whose nChannels
 // the caller has set) from the XwCl entry at `entryOffset`. False, with
 // nothing filled, when the columns asked for do not exist in the entry.
-bool extractXwClSpectrum(Calibration& calibration, std::span<const uint8_t> data, size_t entryOffset, Matrices& matrices);
+bool extractXwClSpectrum(Calibration& calibration, std::span<const uint8_t> data, size_t entryOffset,
+                         Matrices& matrices);
 
 } // namespace calib

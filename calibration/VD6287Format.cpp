@@ -1,8 +1,8 @@
 #include "formats/VD6287Layout.h"
 
-#include "support/CFOwned.h"
-#include "calibration/DriverRecords.h"
 #include "calibration/Calibration.h"
+#include "calibration/DriverRecords.h"
+#include "support/CFOwned.h"
 #include "support/Log.h"
 
 #include <optional>
@@ -28,13 +28,13 @@ struct Move {
     size_t length;
 };
 constexpr Move kMoves[] = {
-    {0, 0, 7},          // type, channels, gains, gain index
-    {11, 9, 6},         // unnamed settings
-    {17, 19, 4},        // values A and B
-    {21, 23, 108},      // gain ratios
-    {141, 143, 95},     // channel factors, lux and colour-temperature coefficients, values
-    {238, 239, 4812},   // spectra
-    {5050, 5051, 4},    // tail word
+    {0, 0, 7},        // type, channels, gains, gain index
+    {11, 9, 6},       // unnamed settings
+    {17, 19, 4},      // values A and B
+    {21, 23, 108},    // gain ratios
+    {141, 143, 95},   // channel factors, lux and colour-temperature coefficients, values
+    {238, 239, 4812}, // spectra
+    {5050, 5051, 4},  // tail word
 };
 
 constexpr unsigned kV1TableEntries = 4; // tables A and B hold four values in version 1
@@ -90,7 +90,8 @@ void putGainTable(driver::RecordBuffer& out, size_t at, std::span<const uint8_t>
     float step = 4.0f;
     out.put<float>(at + 8, step);
     for (unsigned g = 0; g < kGains; ++g) {
-        const double ratio = double(le::get<uint16_t>(b, blob::gainRatio + blob::gainRatioStride * j + 2 * g)) / 16384.0;
+        const double ratio =
+            double(le::get<uint16_t>(b, blob::gainRatio + blob::gainRatioStride * j + 2 * g)) / 16384.0;
         step = float(double(step) * ratio);
         out.put<float>(at + 12 + 4 * g, step);
     }

@@ -1,9 +1,9 @@
 #include "formats/XwCAT2Layout.h"
 
-#include "support/CFOwned.h"
+#include "calibration/Calibration.h"
 #include "calibration/ChipId.h"
 #include "calibration/DriverRecords.h"
-#include "calibration/Calibration.h"
+#include "support/CFOwned.h"
 #include "support/Log.h"
 
 #include <Tessary/Tessary.h>

@@ -1,8 +1,8 @@
 #include "calibration/XwClFormat.h"
 
+#include "calibration/Calibration.h"
 #include "calibration/ChipId.h"
 #include "calibration/DriverRecords.h"
-#include "calibration/Calibration.h"
 #include "support/Log.h"
 
 namespace calib {
@@ -46,8 +46,7 @@ size_t chooseEntry(const Variant& variant, std::span<const uint8_t> data)
         return entryOffset(0);
     const unsigned selector = le::get<uint8_t>(data, header::entrySelector);
     if (selector < 1 || selector > entries) {
-        VLOG_ERROR("XwCl entry selector %u names no entry of %u -> calibration will be skipped.\n", selector,
-                   entries);
+        VLOG_ERROR("XwCl entry selector %u names no entry of %u -> calibration will be skipped.\n", selector, entries);
         return 0;
     }
     return entryOffset(selector - 1);

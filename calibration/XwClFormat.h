@@ -3,10 +3,10 @@
 // channel spectra.
 #pragma once
 
-#include "support/CFOwned.h"
+#include "calibration/Calibration.h"
 #include "formats/XwClLayout.h"
 #include "lightdb/LDBMInfo.h"
-#include "calibration/Calibration.h"
+#include "support/CFOwned.h"
 
 #include <cstddef>
 #include <cstdint>

@@ -154,8 +154,8 @@ VANTISH_SIMD_VARIANTS(weighSamplesAt, weighSamples, bool, (const SimilarityInput
 bool similarityWeights(const SpectralDatabase& db, const float* channels, int M, const float* sigma,
                        const WeightSettings& settings, float* weights)
 {
-    SimilarityInput in{db.dbChannelResponses.data(), db.dbSampleCount, M, {}, {}, 0.0, settings.exponent,
-                       settings.offset};
+    SimilarityInput in{
+        db.dbChannelResponses.data(), db.dbSampleCount, M, {}, {}, 0.0, settings.exponent, settings.offset};
     for (int j = 0; j < M; ++j) {
         in.x[j] = channels[j];
         in.measuredSquares += in.x[j] * in.x[j];

@@ -50,8 +50,7 @@ void calculateSTD(float* data, float* out, int n, int m)
     }
 }
 
-bool multiplyMatrices(float* A, unsigned rowsA, unsigned colsA, float* B, unsigned rowsB,
-                                     unsigned colsB, float* C)
+bool multiplyMatrices(float* A, unsigned rowsA, unsigned colsA, float* B, unsigned rowsB, unsigned colsB, float* C)
 {
     if (colsA != rowsB) {
         VLOG_ERROR("wrong matrix size \n");

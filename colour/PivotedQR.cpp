@@ -102,8 +102,7 @@ private:
                 float above = at(k - 1, q);
                 float t = v_[q] * v_[q] - above * above;
                 float r00 = v_[p_[0]];
-                v_[q] = t <= r00 * r00 * kRecomputeFraction ? cblas_snrm2(m_ - k, column(A_, q) + k, 1)
-                                                            : std::sqrt(t);
+                v_[q] = t <= r00 * r00 * kRecomputeFraction ? cblas_snrm2(m_ - k, column(A_, q) + k, 1) : std::sqrt(t);
             }
             if (v_[q] > largest) {
                 largest = v_[q];

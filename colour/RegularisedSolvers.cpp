@@ -169,7 +169,6 @@ void solver::augmentedSolve(int N, int M, const float* T, const float* w, const 
 
 namespace {
 
-
 // One reflection per column folds the heavy rows (K rows of W doubles: the
 // channels, X, Y, Z, then zeros) into the triangle U (M rows of W doubles).
 // A reflection for column k touches only row k of U and the heavy rows (U's
@@ -263,8 +262,9 @@ template <int W>
         std::memcpy(&wv, w + i, sizeof wv);
         std::memcpy(&av, first + i, sizeof av);
         // Heavy samples count with weight 0.
-        const LightFloat8 weight = (LightFloat8)((LightInt8) wv & (wv < heavy));
-        const LightDouble8 wa = __builtin_convertvector(weight, LightDouble8) * __builtin_convertvector(av, LightDouble8);
+        const LightFloat8 weight = (LightFloat8) ((LightInt8) wv & (wv < heavy));
+        const LightDouble8 wa =
+            __builtin_convertvector(weight, LightDouble8) * __builtin_convertvector(av, LightDouble8);
         for (int k = 0; k < count; ++k) {
             LightFloat8 bv;
             std::memcpy(&bv, second[k] + i, sizeof bv);
@@ -419,8 +419,8 @@ extern "C" void hybridSolveWithRegularization(int N, int M, const float* T, cons
     augmentedSolve(N, M, T, w, R, H, lambda);
 }
 
-extern "C" void specialSolveWithRegularization(int N, int M, const float* T, const float* w, const float* R,
-                                               float* H, float lambda)
+extern "C" void specialSolveWithRegularization(int N, int M, const float* T, const float* w, const float* R, float* H,
+                                               float lambda)
 {
     if (!argumentsUsable(N, M)) {
         markFailed(M, H);
@@ -434,8 +434,8 @@ extern "C" void specialSolveWithRegularization(int N, int M, const float* T, con
     solveWithFactor(M, H, U);
 }
 
-extern "C" void generalSolveWithRegularization(int N, int M, const float* T, const float* w, const float* R,
-                                               float* H, float lambda)
+extern "C" void generalSolveWithRegularization(int N, int M, const float* T, const float* w, const float* R, float* H,
+                                               float lambda)
 {
     if (!argumentsUsable(N, M)) {
         markFailed(M, H);

@@ -21,20 +21,20 @@
 #define VANTISH_TARGET_AVX512
 #endif
 
-#define VANTISH_SIMD_VARIANTS(name, kernel, result, parameters, arguments)                                       \
-    result name##Baseline parameters { return kernel arguments; }                                                \
-    VANTISH_TARGET_AVX2 result name##Avx2 parameters { return kernel arguments; }                                \
-    VANTISH_TARGET_AVX512 result name##Avx512 parameters { return kernel arguments; }                            \
-    result name(SimdLevel level, VANTISH_SIMD_UNPACK parameters)                                                  \
-    {                                                                                                            \
-        switch (level) {                                                                                         \
-        case SimdLevel::Avx512:                                                                                  \
-            return name##Avx512 arguments;                                                                       \
-        case SimdLevel::Avx2:                                                                                    \
-            return name##Avx2 arguments;                                                                         \
-        case SimdLevel::Baseline:                                                                                \
-            break;                                                                                               \
-        }                                                                                                        \
-        return name##Baseline arguments;                                                                         \
+#define VANTISH_SIMD_VARIANTS(name, kernel, result, parameters, arguments)            \
+    result name##Baseline parameters { return kernel arguments; }                     \
+    VANTISH_TARGET_AVX2 result name##Avx2 parameters { return kernel arguments; }     \
+    VANTISH_TARGET_AVX512 result name##Avx512 parameters { return kernel arguments; } \
+    result name(SimdLevel level, VANTISH_SIMD_UNPACK parameters)                      \
+    {                                                                                 \
+        switch (level) {                                                              \
+        case SimdLevel::Avx512:                                                       \
+            return name##Avx512 arguments;                                            \
+        case SimdLevel::Avx2:                                                         \
+            return name##Avx2 arguments;                                              \
+        case SimdLevel::Baseline:                                                     \
+            break;                                                                    \
+        }                                                                             \
+        return name##Baseline arguments;                                              \
     }
 #define VANTISH_SIMD_UNPACK(...) __VA_ARGS__

@@ -58,8 +58,7 @@ void generalSolveWithRegularization(int N, int M, const float* T, const float* w
 // C[4j + c] = sum over i < count of (w_i * R[j*ldR + i]) * T[c*ldT + i], for
 // j < M and c < 3; C[4j + 3] is not written. Summed in single precision over
 // eight lanes (i mod 8), folded to four, two and one lane as the blocks shrink.
-void weightedCrossProduct(int count, int M, const float* T, int ldT, const float* w, const float* R, int ldR,
-                          float* C);
+void weightedCrossProduct(int count, int M, const float* T, int ldT, const float* w, const float* R, int ldR, float* C);
 // Packed G(a, b) = sum over i < count of (w_i * R[a*ldR + i]) * R[b*ldR + i],
 // summed like weightedCrossProduct.
 void weightedGramPacked(int count, int M, const float* R, int ldR, const float* w, float* G);

@@ -81,10 +81,14 @@ template <int K>
                                               float* out)
 {
     switch (K) {
-    case 1: return laneSums<1>(count, w, a, b, out);
-    case 2: return laneSums<2>(count, w, a, b, out);
-    case 3: return laneSums<3>(count, w, a, b, out);
-    default: return laneSums<4>(count, w, a, b, out);
+    case 1:
+        return laneSums<1>(count, w, a, b, out);
+    case 2:
+        return laneSums<2>(count, w, a, b, out);
+    case 3:
+        return laneSums<3>(count, w, a, b, out);
+    default:
+        return laneSums<4>(count, w, a, b, out);
     }
 }
 
@@ -113,13 +117,13 @@ template <int K>
 VANTISH_SIMD_VARIANTS(crossProductAt, crossProduct, void,
                       (int count, int M, const float* T, int ldT, const float* w, const float* R, int ldR, float* C),
                       (count, M, T, ldT, w, R, ldR, C))
-VANTISH_SIMD_VARIANTS(gramPackedAt, gramPacked, void, (int count, int M, const float* R, int ldR, const float* w, float* G),
-                      (count, M, R, ldR, w, G))
+VANTISH_SIMD_VARIANTS(gramPackedAt, gramPacked, void,
+                      (int count, int M, const float* R, int ldR, const float* w, float* G), (count, M, R, ldR, w, G))
 
 } // namespace
 
-extern "C" void weightedCrossProduct(int count, int M, const float* T, int ldT, const float* w, const float* R,
-                                     int ldR, float* C)
+extern "C" void weightedCrossProduct(int count, int M, const float* T, int ldT, const float* w, const float* R, int ldR,
+                                     float* C)
 {
     crossProductAt(activeSimdLevel(), count, M, T, ldT, w, R, ldR, C);
 }

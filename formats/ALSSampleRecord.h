@@ -42,23 +42,23 @@ struct ALSSampleRecord {
     static constexpr size_t kFilteredLuxValidOffset = 136;
 
     uint32_t status = 0;
-    uint8_t sampleChannelCount = 0;       // channels present in this sample
+    uint8_t sampleChannelCount = 0; // channels present in this sample
     uint8_t sampleOrientation = 0;
-    uint16_t nits = 0;                    // display brightness
+    uint16_t nits = 0; // display brightness
     uint32_t integrationTime = 0;
     uint32_t reportInterval = 0;
-    int32_t gain = 0;                     // 16.16 fixed point
-    float lux = 0.0f;                     // illuminance from the sensor side
+    int32_t gain = 0; // 16.16 fixed point
+    float lux = 0.0f; // illuminance from the sensor side
     float rawLux = 0.0f;
     std::array<float, 6> channelValues{}; // c0 to c5
     float cct = 0.0f;
     uint32_t timestamp = 0;
     uint16_t subsamples = 0;
-    uint8_t mode = 0;                     // 0 synchronous, other asynchronous
+    uint8_t mode = 0; // 0 synchronous, other asynchronous
     std::array<uint32_t, 5> xTalk{};
-    uint8_t xyzInRecord = 0;              // the plug-in's XYZ goes into xyzResult
+    uint8_t xyzInRecord = 0; // the plug-in's XYZ goes into xyzResult
     std::array<float, 3> xyzResult{};
-    std::array<float, 3> xyzSensor{};     // X, Y, Z from the sensor side
+    std::array<float, 3> xyzSensor{}; // X, Y, Z from the sensor side
     float filteredLux = 0.0f;
     uint8_t filteredLuxValid = 0;
 

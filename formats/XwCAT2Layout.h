@@ -16,14 +16,14 @@ inline constexpr unsigned kSpectrumSamples = 401;
 inline constexpr size_t kChipIdDigits = 8;
 
 // Offsets (c = channel, g = gain, s = sample).
-inline constexpr size_t versionMajor = 4;    // u8
-inline constexpr size_t versionMinor = 5;    // u8
-inline constexpr size_t chipID = 16;         // char[8], hexadecimal, not terminated
-inline constexpr size_t deviceID = 28;       // u8
-inline constexpr size_t nChannels = 80;      // u8
-inline constexpr size_t nGains = 81;         // u8
-inline constexpr size_t fudge = 82;          // u16, 14 fraction bits
-inline constexpr size_t gainScale = 84;      // u16, + 18 c + 2 g
+inline constexpr size_t versionMajor = 4; // u8
+inline constexpr size_t versionMinor = 5; // u8
+inline constexpr size_t chipID = 16;      // char[8], hexadecimal, not terminated
+inline constexpr size_t deviceID = 28;    // u8
+inline constexpr size_t nChannels = 80;   // u8
+inline constexpr size_t nGains = 81;      // u8
+inline constexpr size_t fudge = 82;       // u16, 14 fraction bits
+inline constexpr size_t gainScale = 84;   // u16, + 18 c + 2 g
 inline constexpr size_t gainScaleStride = 18;
 inline constexpr size_t channelParamA = 192; // u16, + 2 c
 inline constexpr size_t offsetCounts = 204;  // i16, + 2 c

@@ -76,19 +76,32 @@ CFTypeRef value(fz::Input& in, int depth)
 {
     const uint8_t tag = in.take<uint8_t>();
     switch (tag % 13) {
-    case 1: return CFRetain(kCFBooleanTrue);
-    case 2: return CFRetain(kCFBooleanFalse);
-    case 3: return number<int8_t>(in, kCFNumberSInt8Type);
-    case 4: return number<int16_t>(in, kCFNumberSInt16Type);
-    case 5: return number<int32_t>(in, kCFNumberSInt32Type);
-    case 6: return number<int64_t>(in, kCFNumberSInt64Type);
-    case 7: return number<float>(in, kCFNumberFloat32Type);
-    case 8: return number<double>(in, kCFNumberFloat64Type);
-    case 9: return string(in);
-    case 10: return fz::createData(in.takeBytes(in.take<uint8_t>()));
-    case 11: return depth < kMaxDepth ? array(in, depth) : nullptr;
-    case 12: return depth < kMaxDepth ? dictionary(in, depth) : nullptr;
-    default: return nullptr;
+    case 1:
+        return CFRetain(kCFBooleanTrue);
+    case 2:
+        return CFRetain(kCFBooleanFalse);
+    case 3:
+        return number<int8_t>(in, kCFNumberSInt8Type);
+    case 4:
+        return number<int16_t>(in, kCFNumberSInt16Type);
+    case 5:
+        return number<int32_t>(in, kCFNumberSInt32Type);
+    case 6:
+        return number<int64_t>(in, kCFNumberSInt64Type);
+    case 7:
+        return number<float>(in, kCFNumberFloat32Type);
+    case 8:
+        return number<double>(in, kCFNumberFloat64Type);
+    case 9:
+        return string(in);
+    case 10:
+        return fz::createData(in.takeBytes(in.take<uint8_t>()));
+    case 11:
+        return depth < kMaxDepth ? array(in, depth) : nullptr;
+    case 12:
+        return depth < kMaxDepth ? dictionary(in, depth) : nullptr;
+    default:
+        return nullptr;
     }
 }
 

@@ -63,9 +63,14 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
         if (!row)
             break;
         switch (row->kind) {
-        case host::InputRow::Kind::Sample: useSample(*row); break;
-        case host::InputRow::Kind::SetProperty: useProperty(*row); break;
-        case host::InputRow::Kind::CopyEvent: break;
+        case host::InputRow::Kind::Sample:
+            useSample(*row);
+            break;
+        case host::InputRow::Kind::SetProperty:
+            useProperty(*row);
+            break;
+        case host::InputRow::Kind::CopyEvent:
+            break;
         }
     }
     for (const auto& error : errors)

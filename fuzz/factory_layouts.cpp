@@ -10,11 +10,11 @@
 // layout's exact size (XwCl: two entries when longer than one).
 #include "common/FuzzSupport.h"
 
-#include "support/CFOwned.h"
 #include "calibration/SpectrumExtraction.h"
+#include "calibration/XwClFormat.h"
 #include "formats/VD6287Layout.h"
 #include "formats/XwCAT2Layout.h"
-#include "calibration/XwClFormat.h"
+#include "support/CFOwned.h"
 
 #include <cstdlib>
 #include <vector>
@@ -44,7 +44,8 @@ void checkExtracted(VantishPlugIn& p, const Matrices& m, bool extracted)
         return;
     // What the reference scan relies on: whole spectra for every column and
     // a weight for every sensor channel.
-    if (m.nChannels < 1 || m.channelSpectra.size() != size_t(m.nChannels) * parts(p).unit().spectrumSampleCount.load() ||
+    if (m.nChannels < 1 ||
+        m.channelSpectra.size() != size_t(m.nChannels) * parts(p).unit().spectrumSampleCount.load() ||
         m.channelWeights.size() != parts(p).unit().numberOfChannels.load())
         std::abort();
 }
@@ -107,22 +108,38 @@ extern "C" int LLVMFuzzerTestOneInput(const uint8_t* data, size_t size)
 
     std::vector<uint8_t> bytes;
     switch (layout) {
-    case XwCAT2: bytes = fitted(input.rest(), stored::xwca::kSize); break;
+    case XwCAT2:
+        bytes = fitted(input.rest(), stored::xwca::kSize);
+        break;
     case XwCl:
         bytes = fitted(input.rest(), input.size() > stored::xwcl::kOneEntrySize ? stored::xwcl::kTwoEntrySize
-                                                                                 : stored::xwcl::kOneEntrySize);
+                                                                                : stored::xwcl::kOneEntrySize);
         break;
-    case VD6287v1: bytes = fitted(input.rest(), stored::vd6287::kV1Size); break;
-    case VD6287v3: bytes = fitted(input.rest(), stored::vd6287::kV3Size); break;
-    default: bytes.assign(input.rest().begin(), input.rest().end()); break;
+    case VD6287v1:
+        bytes = fitted(input.rest(), stored::vd6287::kV1Size);
+        break;
+    case VD6287v3:
+        bytes = fitted(input.rest(), stored::vd6287::kV3Size);
+        break;
+    default:
+        bytes.assign(input.rest().begin(), input.rest().end());
+        break;
     }
     CFOwned<CFDataRef> record(fz::createData(bytes));
 
     switch (layout) {
-    case XwCAT2: parseXwCAT2(*plugin, record.get()); break;
-    case XwCl: parseXwCl(*plugin, record.get()); break;
-    case VD6287v1: parseVD6287v1(*plugin, record.get()); break;
-    case VD6287v3: parseVD6287v3(*plugin, record.get()); break;
+    case XwCAT2:
+        parseXwCAT2(*plugin, record.get());
+        break;
+    case XwCl:
+        parseXwCl(*plugin, record.get());
+        break;
+    case VD6287v1:
+        parseVD6287v1(*plugin, record.get());
+        break;
+    case VD6287v3:
+        parseVD6287v3(*plugin, record.get());
+        break;
     default:
         // Bytes of any length: every parser must refuse what is not its size.
         parseXwCAT2(*plugin, record.get());

@@ -13,10 +13,10 @@
 // "ALSSensorType"; the rest is the record.
 #include "common/FuzzSupport.h"
 
-#include "support/CFOwned.h"
 #include "formats/VD6287Layout.h"
 #include "formats/XwCAT2Layout.h"
 #include "formats/XwClLayout.h"
+#include "support/CFOwned.h"
 
 #include <Tessary/Tessary.h>
 #include <VantishPlatform/DeviceState.h>

@@ -12,8 +12,7 @@ bool processCachedDB(const CacheKey& key, int channelCount, BigDBType type, Spec
     // The arrays are sized from the channel count: one no record layout can
     // carry is refused before anything is read or allocated.
     if (channelCount < 1 || channelCount > kMaxDatabaseChannels) {
-        VLOG_ERROR("A per-chip database of %d channels cannot be kept (1 to %d)\n", channelCount,
-                   kMaxDatabaseChannels);
+        VLOG_ERROR("A per-chip database of %d channels cannot be kept (1 to %d)\n", channelCount, kMaxDatabaseChannels);
         return false;
     }
     const int cacheOrientation = key.orientation;

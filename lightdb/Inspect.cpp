@@ -1,4 +1,5 @@
 #include "lightdb/Inspect.h"
+
 #include "lightdb/CNumbers.h"
 #include "lightdb/LDBM.h"
 #include "lightdb/SqliteConnection.h"

@@ -10,10 +10,10 @@
 
 struct LDBMFileSummary {
     enum class Kind { Unknown, Reference, Cache };
-    Kind kind = Kind::Unknown;     // Reference: has Spectra; Cache: has RR
-    bool hasInfo = false;          // an Info table was read
-    LDBMInfo info;                 // its last row; absent columns keep LDBMInfo's defaults
-    int64_t rows = 0;              // rows of Spectra (reference) or RR (cache)
+    Kind kind = Kind::Unknown; // Reference: has Spectra; Cache: has RR
+    bool hasInfo = false;      // an Info table was read
+    LDBMInfo info;             // its last row; absent columns keep LDBMInfo's defaults
+    int64_t rows = 0;          // rows of Spectra (reference) or RR (cache)
     // Reference: the sample columns ordered by sample index; cache: the RR
     // (channel) columns in table order.
     std::vector<std::string> columns;

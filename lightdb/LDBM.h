@@ -13,10 +13,10 @@
 
 enum class LDBMResult : int {
     Ok = 0,
-    BadSourceIDs = -1,    // LDBMParseBigDB: the Spectra IDs are not exactly 0 .. N-1
-    CacheNotPlaced = 2,   // LDBMCreateSmallDB: the file cannot be opened or put in place
-    CacheNotWritten = 3,  // LDBMCreateSmallDB: a channel count other than 4 or 5, or a failed RR table
-    NoWriteAheadLog = 4,  // LDBMCreateSmallDB: write-ahead logging cannot be switched on
+    BadSourceIDs = -1,   // LDBMParseBigDB: the Spectra IDs are not exactly 0 .. N-1
+    CacheNotPlaced = 2,  // LDBMCreateSmallDB: the file cannot be opened or put in place
+    CacheNotWritten = 3, // LDBMCreateSmallDB: a channel count other than 4 or 5, or a failed RR table
+    NoWriteAheadLog = 4, // LDBMCreateSmallDB: write-ahead logging cannot be switched on
 };
 
 // The number a result is logged with.
@@ -52,7 +52,8 @@ constexpr int32_t LDBMMaxSources = 65536;
 // when it is valid, sets *cacheValid and overwrites `info` with the cache's Info.
 // Ok, the reference's open or statement code, or SQLITE_CORRUPT when the
 // reference gives a negative source count or more than LDBMMaxSources.
-LDBMResult LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType type, float expectedSmallVersion);
+LDBMResult LDBMInitialize(int orientation, LDBMInfo* info, bool* cacheValid, BigDBType type,
+                          float expectedSmallVersion);
 
 // Loads the cache's RR and XX tables into `responses` (responseRows x N) and
 // `xyz` (3 x N), N = info->sources. Columns for rows at or beyond `responseRows`
@@ -65,4 +66,4 @@ LDBMResult LDBMParseSmallDB(int orientation, const LDBMInfo* info, float* xyz, f
 // Ok; CacheNotPlaced, NoWriteAheadLog or CacheNotWritten as above; otherwise
 // the code of the failing statement or of the final checkpoint.
 LDBMResult LDBMCreateSmallDB(const LDBMInfo* info, const float* xyz, const float* responses, int orientation, int algo,
-                      int channelCount, unsigned chipID, float smallVersion);
+                             int channelCount, unsigned chipID, float smallVersion);

@@ -5,11 +5,11 @@
 #include <cstdint>
 
 struct LDBMInfo {
-    float version = 0.0f;      // "version": version of the reference data
-    int32_t sources = 0;       // "sources": number of light sources N
-    int32_t algo = -1;         // "algo": colour-algorithm version
+    float version = 0.0f;       // "version": version of the reference data
+    int32_t sources = 0;        // "sources": number of light sources N
+    int32_t algo = -1;          // "algo": colour-algorithm version
     float smallVersion = -1.0f; // "smallversion": per-chip database format version
-    uint32_t chipID = 0;       // "chipID": sensor chip identifier
+    uint32_t chipID = 0;        // "chipID": sensor chip identifier
 };
 
 // Selects the reference database file; any non-zero value selects the second.

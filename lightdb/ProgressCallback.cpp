@@ -72,6 +72,7 @@ int ProgressCallback(void* matrices, int id, float* xyz, float* spectrum, int sa
         return 1;
 
     for (int32_t j = 0; j < m.nChannels - m.firstChannel; ++j)
-        m.responsesOut[size_t(id) + n * size_t(j)] = float((kResponseTotal / total) * response[size_t(m.firstChannel + j)]);
+        m.responsesOut[size_t(id) + n * size_t(j)] =
+            float((kResponseTotal / total) * response[size_t(m.firstChannel + j)]);
     return 0;
 }

@@ -51,8 +51,8 @@ int componentOf(const char* name)
 // Reads RR or XX rows into `destination`, row r component k at r + N * k.
 struct TableReader {
     float* destination;
-    int32_t sources;    // N
-    int components;     // rows the destination holds; other components are skipped
+    int32_t sources; // N
+    int components;  // rows the destination holds; other components are skipped
     int32_t rowCount = 0;
 };
 
@@ -177,8 +177,8 @@ std::mutex& writerMutex()
 
 // Writes the tables into `file`, then moves everything the write-ahead log
 // holds into the file itself, so that the file alone is the cache.
-int buildCache(const std::string& file, const LDBMInfo& info, const float* xyz, const float* responses,
-               int orientation, int algo, int channelCount, unsigned chipID, float smallVersion)
+int buildCache(const std::string& file, const LDBMInfo& info, const float* xyz, const float* responses, int orientation,
+               int algo, int channelCount, unsigned chipID, float smallVersion)
 {
     // On the device the open also carries a platform-only flag (0x00400000)
     // that picks the file's data-protection class; SQLite here has no such
@@ -268,7 +268,7 @@ LDBMResult LDBMParseSmallDB(int orientation, const LDBMInfo* info, float* xyz, f
 }
 
 LDBMResult LDBMCreateSmallDB(const LDBMInfo* info, const float* xyz, const float* responses, int orientation, int algo,
-                      int channelCount, unsigned chipID, float smallVersion)
+                             int channelCount, unsigned chipID, float smallVersion)
 {
     const std::string path = cacheFile(orientation);
     const std::string building = buildingFile(path);

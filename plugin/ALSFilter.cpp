@@ -8,11 +8,11 @@
 // replaces it meanwhile.
 #include "colour/ColourCalculation.h"
 #include "formats/ALSSampleRecord.h"
-#include "plugin/SampleRecordBytes.h"
 #include "plugin/ChromaticityOverride.h"
-#include "support/Log.h"
+#include "plugin/SampleRecordBytes.h"
 #include "plugin/SpikeDetector.h"
 #include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 #include <array>
 #include <cmath>
@@ -39,10 +39,7 @@ constexpr double kComparisonThreshold = 0.005; // 0.5 % of our own value
 // one and then every 1000th.
 constexpr uint64_t kShortRecordLogInterval = 1000;
 
-bool isALSEvent(IOHIDEventRef event)
-{
-    return event && IOHIDEventGetType(event) == kIOHIDEventTypeAmbientLightSensor;
-}
+bool isALSEvent(IOHIDEventRef event) { return event && IOHIDEventGetType(event) == kIOHIDEventTypeAmbientLightSensor; }
 
 void writeEventXYZ(IOHIDEventRef event, const XYZ& xyz)
 {
@@ -86,8 +83,8 @@ bool rejectSpike(IOHIDEventRef event, const ALSSampleRecord& record, const Spike
 // Replaces the colour input and the record's channels by the client's values
 // and shows them in the event: in the driver's record and the raw channel fields.
 void applyRGBCOverride(const ClientOverrides& overrides, IOHIDEventRef event, ALSSampleRecord& record,
-                       std::span<uint8_t> recordBytes, std::array<float, kMaxChannels>& channel,
-                       uint32_t channelCount, uint32_t skip)
+                       std::span<uint8_t> recordBytes, std::array<float, kMaxChannels>& channel, uint32_t channelCount,
+                       uint32_t skip)
 {
     std::array<uint32_t, kMaxChannels> values{};
     for (size_t i = 0; i < values.size(); ++i)

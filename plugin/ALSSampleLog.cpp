@@ -4,8 +4,8 @@
 // otherwise a short line from the event's own fields.
 #include "formats/ALSSampleRecord.h"
 #include "plugin/SampleRecordBytes.h"
-#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 #include <cstdio>
 #include <utility>
@@ -36,9 +36,9 @@ void logFullLine(double seconds, double lux, std::pair<float, float> xy, const A
     VLOG_DEFAULT("[ALS] ts=%.3f lux=%.3f%s xy=(%.3f %.3f) chs=[%.0f %.0f %.0f %.0f %.0f] CCT1=%.3f gain=%dx "
                  "mode=%s subsamples=%u rawLux=%.3f nits=%u xTalk=[%u %u %u %u %u] status=0x%02X copyEvent=%d",
                  seconds, lux, filteredLux, double(xy.first), double(xy.second), double(c[0]), double(c[1]),
-                 double(c[2]), double(c[3]), double(c[4]), double(r.cct), int(r.gain >> 16),
-                 r.mode ? "ASYNC" : "SYNC", unsigned(r.subsamples), double(r.rawLux), unsigned(r.nits), r.xTalk[0],
-                 r.xTalk[1], r.xTalk[2], r.xTalk[3], r.xTalk[4], r.status, int(isCopyEvent));
+                 double(c[2]), double(c[3]), double(c[4]), double(r.cct), int(r.gain >> 16), r.mode ? "ASYNC" : "SYNC",
+                 unsigned(r.subsamples), double(r.rawLux), unsigned(r.nits), r.xTalk[0], r.xTalk[1], r.xTalk[2],
+                 r.xTalk[3], r.xTalk[4], r.status, int(isCopyEvent));
 }
 
 void logShortLine(IOHIDEventRef event, double seconds, double lux, std::pair<float, float> xy, bool isCopyEvent)
@@ -68,8 +68,8 @@ void VantishPlugIn::logALSSample(IOHIDEventRef event, bool isCopyEvent)
 
     // Only a record of exactly the driver's size gets the full line.
     const std::span<uint8_t> recordBytes = sampleRecordBytes(event);
-    const auto record = recordBytes.size() == ALSSampleRecord::kSize ? ALSSampleRecord::decode(recordBytes)
-                                                                      : std::nullopt;
+    const auto record =
+        recordBytes.size() == ALSSampleRecord::kSize ? ALSSampleRecord::decode(recordBytes) : std::nullopt;
     if (record)
         logFullLine(seconds, lux, xy, *record, isCopyEvent);
     else

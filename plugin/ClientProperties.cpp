@@ -1,9 +1,9 @@
 // Properties that clients of the event system set on the ALS service: the test
 // overrides of channels and chromaticity, two tuning values, and the command
 // that rebuilds calibration and databases.
+#include "plugin/VantishPlugIn.h"
 #include "support/CFTypes.h"
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
 #include "sysconfig/SysConfigCalibration.h"
 
 #include <algorithm>

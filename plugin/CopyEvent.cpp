@@ -1,8 +1,8 @@
 // Events that a client copies from the service instead of receiving them
 // through the event stream: they get the colour of the last filtered sample.
 #include "plugin/ChromaticityOverride.h"
-#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 #include <array>
 
@@ -29,8 +29,8 @@ void fillCopiedColour(const std::array<std::atomic<float>, 3>& lastXYZ, const Cl
     }
     if (const auto override = ChromaticityOverride::active(overrides))
         xyz = applyChromaticityOverride(event, *override);
-    VLOG_INFO("Copy event with color = [%f, %f, %f], color space = %ld", double(xyz[0]), double(xyz[1]),
-              double(xyz[2]), colourSpace);
+    VLOG_INFO("Copy event with color = [%f, %f, %f], color space = %ld", double(xyz[0]), double(xyz[1]), double(xyz[2]),
+              colourSpace);
 }
 
 } // namespace

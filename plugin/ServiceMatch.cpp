@@ -1,7 +1,7 @@
 // Which HID services the plug-in attaches to: ambient-light sensors whose
 // device-tree name or driver class is one of the colour sensors.
-#include "support/Log.h"
 #include "plugin/VantishPlugIn.h"
+#include "support/Log.h"
 
 #include <array>
 

@@ -1,10 +1,10 @@
 // Opening the plug-in on a service: configuration from the service's
 // properties, the device tree and device information, then calibration
 // bring-up queued on the high-priority global queue.
+#include "plugin/VantishPlugIn.h"
 #include "support/CFTypes.h"
 #include "support/LittleEndian.h"
 #include "support/Log.h"
-#include "plugin/VantishPlugIn.h"
 #include "sysconfig/SysConfigCalibration.h"
 
 #include <Tessary/Tessary.h>

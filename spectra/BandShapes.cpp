@@ -26,14 +26,16 @@ Spectrum band(double peakNm, double shortHalfWidthNm, double longHalfWidthNm)
 Spectrum line(double centreNm, double fwhmNm)
 {
     const double half = std::max(fwhmNm, kMinLineFwhmNm) / 2.0;
-    if (centreNm < kFirstNm - 4 * half || centreNm > kLastNm + 4 * half) return Spectrum{};
+    if (centreNm < kFirstNm - 4 * half || centreNm > kLastNm + 4 * half)
+        return Spectrum{};
     return band(centreNm, half, half);
 }
 
 Spectrum lines(std::span<const Line> list, double fwhmNm)
 {
     Spectrum sum{};
-    for (const Line& l : list) sum = addScaled(sum, line(l.nm, fwhmNm), l.power);
+    for (const Line& l : list)
+        sum = addScaled(sum, line(l.nm, fwhmNm), l.power);
     return sum;
 }
 

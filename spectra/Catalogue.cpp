@@ -25,14 +25,16 @@ std::string kelvinName(int kelvin) { return str(kelvin) + "K"; }
 std::vector<int> steps(int first, int last, int step)
 {
     std::vector<int> values;
-    for (int v = first; v <= last; v += step) values.push_back(v);
+    for (int v = first; v <= last; v += step)
+        values.push_back(v);
     return values;
 }
 
 std::vector<int> joined(std::initializer_list<std::vector<int>> parts)
 {
     std::vector<int> all;
-    for (const auto& part : parts) all.insert(all.end(), part.begin(), part.end());
+    for (const auto& part : parts)
+        all.insert(all.end(), part.begin(), part.end());
     return all;
 }
 
@@ -93,8 +95,8 @@ SetRecipe defaultRecipe()
     r.planckKelvins = joined({steps(1800, 2800, 100), {2856}, steps(2900, 4000, 100)});
     r.daylightKelvins = joined({steps(4000, 7000, 100), steps(7250, 10000, 250), steps(11000, 25000, 1000)});
     r.ledPumps = {440, 445, 450, 455, 460};
-    r.ledPhosphors = {{555, 100}, {555, 130}, {560, 100}, {560, 115}, {560, 130},
-                      {565, 100}, {565, 115}, {565, 130}, {570, 100}, {570, 115}, {570, 130}};
+    r.ledPhosphors = {{555, 100}, {555, 130}, {560, 100}, {560, 115}, {560, 130}, {565, 100},
+                      {565, 115}, {565, 130}, {570, 100}, {570, 115}, {570, 130}};
     r.ledKelvins = {4000, 4500, 5000, 5700, 6500};
     r.redLedPumps = {445, 450, 455};
     r.redLedPhosphors = {{530, 100}, {545, 105}};
@@ -154,7 +156,8 @@ public:
             return;
         }
         const std::optional<Spectrum> spectrum = make();
-        if (!spectrum) return;
+        if (!spectrum)
+            return;
         c_.index.emplace(name, c_.sources.size());
         set.push_back(c_.sources.size());
         c_.sources.push_back(Source{name, family, atIlluminance(*spectrum, kReferenceLux)});
@@ -181,25 +184,30 @@ std::string ledName(const WhiteLed& l)
 {
     std::string name = (l.redPeakNm > 0 ? "ledr-" : "led-") + str(int(l.pumpNm)) + "-" + str(int(l.phosphorPeakNm)) +
                        "-" + str(int(l.phosphorFwhmNm));
-    if (l.redPeakNm > 0) name += "-r" + str(int(l.redPeakNm)) + "w" + str(int(l.redFwhmNm));
+    if (l.redPeakNm > 0)
+        name += "-r" + str(int(l.redPeakNm)) + "w" + str(int(l.redFwhmNm));
     return name + "-" + kelvinName(int(l.kelvin));
 }
 
 std::string duvTag(int thousandths)
 {
-    if (thousandths == 0) return "duv0";
+    if (thousandths == 0)
+        return "duv0";
     return (thousandths > 0 ? "duvp" : "duvm") + str(thousandths > 0 ? thousandths : -thousandths);
 }
 
 void Builder::addThermal(std::vector<size_t>& set, const SetRecipe& r)
 {
-    for (int k : r.planckKelvins) add(set, "planck-" + kelvinName(k), "planck", [k] { return planck(k); });
-    for (int k : r.daylightKelvins) add(set, "daylight-" + kelvinName(k), "daylight", [k] { return cieDaylight(k); });
+    for (int k : r.planckKelvins)
+        add(set, "planck-" + kelvinName(k), "planck", [k] { return planck(k); });
+    for (int k : r.daylightKelvins)
+        add(set, "daylight-" + kelvinName(k), "daylight", [k] { return cieDaylight(k); });
     add(set, "cie-a", "cie", [] { return cieA(); });
     add(set, "cie-b", "cie", [] { return cieB(); });
     add(set, "cie-c", "cie", [] { return cieC(); });
     add(set, "cie-d65", "cie", [] { return cieD65(); });
-    for (int n = 1; n <= 12; ++n) add(set, "cie-f" + str(n), "cie", [n] { return cieF(n); });
+    for (int n = 1; n <= 12; ++n)
+        add(set, "cie-f" + str(n), "cie", [n] { return cieF(n); });
 }
 
 void Builder::addLeds(std::vector<size_t>& set, const SetRecipe& r)
@@ -214,8 +222,8 @@ void Builder::addLeds(std::vector<size_t>& set, const SetRecipe& r)
         for (PhosphorBand p : r.redLedPhosphors)
             for (PhosphorBand red : r.redLedReds)
                 for (int k : r.redLedKelvins) {
-                    const WhiteLed led{double(pump), double(p.peakNm), double(p.fwhmNm), double(red.peakNm),
-                                       double(red.fwhmNm), double(k)};
+                    const WhiteLed led{double(pump),       double(p.peakNm),   double(p.fwhmNm),
+                                       double(red.peakNm), double(red.fwhmNm), double(k)};
                     add(set, ledName(led), "led-red", [led] { return whiteLed(led); });
                 }
     for (int pump : r.violetPumps)
@@ -229,12 +237,14 @@ void Builder::addDischarge(std::vector<size_t>& set, const SetRecipe& r)
     for (int k : r.triKelvins)
         for (int duv : r.triDuvThousandths)
             for (int c : r.triContinuumPercent)
-                add(set, "tri-" + kelvinName(k) + "-" + duvTag(duv) + "-c" + str(c), "fluorescent",
-                    [=] { return triPhosphorLamp({double(k), duv / 1000.0, c / 100.0}); });
+                add(set, "tri-" + kelvinName(k) + "-" + duvTag(duv) + "-c" + str(c), "fluorescent", [=] {
+                    return triPhosphorLamp({double(k), duv / 1000.0, c / 100.0});
+                });
     for (int b : r.sodiumBroadenings)
         for (int ir : r.sodiumInfraredTenths)
-            add(set, "hps-b" + str(b) + "-ir" + str(ir), "sodium",
-                [=] { return highPressureSodium({double(b), ir / 10.0}); });
+            add(set, "hps-b" + str(b) + "-ir" + str(ir), "sodium", [=] {
+                return highPressureSodium({double(b), ir / 10.0});
+            });
     add(set, "lps", "sodium", [] { return lowPressureSodium(); });
     for (BurnerKind kind : {BurnerKind::Quartz, BurnerKind::Ceramic})
         for (int k : r.halideKelvins)
@@ -299,7 +309,8 @@ std::vector<const Source*> referenceSources(ReferenceSet set)
 {
     const Catalogue& c = instance();
     std::vector<const Source*> out;
-    for (size_t i : set == ReferenceSet::Default ? c.defaultSet : c.dense02Set) out.push_back(&c.sources[i]);
+    for (size_t i : set == ReferenceSet::Default ? c.defaultSet : c.dense02Set)
+        out.push_back(&c.sources[i]);
     return out;
 }
 

@@ -12,10 +12,7 @@ namespace spectra {
 
 namespace {
 
-Spectrum onGrid(const SpectralTable& table, size_t set)
-{
-    return resample(table.wavelengthsNm, table.sets.at(set));
-}
+Spectrum onGrid(const SpectralTable& table, size_t set) { return resample(table.wavelengthsNm, table.sets.at(set)); }
 
 CieData loadCieData()
 {
@@ -23,7 +20,7 @@ CieData loadCieData()
     const SpectralTable daylight = loadSpectralTable(colordPath("ref/CIE-1986-daylight-SPD.cmf"));
     if (cmf.sets.size() != 3 || daylight.sets.size() != 3)
         throw std::runtime_error("CIE tables: expected three sets in the CMF and daylight files");
-    return CieData{onGrid(cmf, 0), onGrid(cmf, 1), onGrid(cmf, 2),
+    return CieData{onGrid(cmf, 0),      onGrid(cmf, 1),      onGrid(cmf, 2),
                    onGrid(daylight, 0), onGrid(daylight, 1), onGrid(daylight, 2)};
 }
 

@@ -25,7 +25,8 @@ Spectrum cieC() { return loadIlluminant("CIE-C.sp").values; }
 
 Spectrum cieF(int number)
 {
-    if (number < 1 || number > 12) throw std::invalid_argument("CIE F illuminants are numbered 1 to 12");
+    if (number < 1 || number > 12)
+        throw std::invalid_argument("CIE F illuminants are numbered 1 to 12");
     return loadIlluminant("CIE-F" + std::to_string(number) + ".sp").values;
 }
 

@@ -27,7 +27,8 @@ Uv locusNormal(double kelvin)
     const double dv = hi.v - lo.v;
     const double length = std::hypot(du, dv);
     Uv n{-dv / length, du / length};
-    if (n.v < 0) n = Uv{-n.u, -n.v};
+    if (n.v < 0)
+        n = Uv{-n.u, -n.v};
     return n;
 }
 
@@ -49,7 +50,8 @@ Xyz tristimulus(const Spectrum& s)
 Xy chromaticity(const Xyz& xyz)
 {
     const double total = xyz.X + xyz.Y + xyz.Z;
-    if (total == 0.0) return Xy{};
+    if (total == 0.0)
+        return Xy{};
     return Xy{xyz.X / total, xyz.Y / total};
 }
 
@@ -71,7 +73,8 @@ std::optional<double> correlatedColourTemperature(const Xy& xy)
 {
     const cmsCIExyY white{xy.x, xy.y, 1.0};
     double kelvin = 0.0;
-    if (!cmsTempFromWhitePoint(&kelvin, &white)) return std::nullopt;
+    if (!cmsTempFromWhitePoint(&kelvin, &white))
+        return std::nullopt;
     return kelvin;
 }
 
@@ -88,7 +91,8 @@ Xy chromaticityAt(double kelvin, double duv)
 std::optional<double> distanceFromLocus(const Xy& xy)
 {
     const std::optional<double> kelvin = correlatedColourTemperature(xy);
-    if (!kelvin) return std::nullopt;
+    if (!kelvin)
+        return std::nullopt;
     const Uv p = uv1960(planckianChromaticity(*kelvin));
     const Uv q = uv1960(xy);
     const Uv n = locusNormal(*kelvin);

@@ -13,9 +13,8 @@ Xy daylightChromaticity(double kelvin)
     if (!(kelvin >= kDaylightMinKelvin && kelvin <= kDaylightMaxKelvin))
         throw std::invalid_argument("daylight: temperature outside 4000 K to 25000 K");
     const double t = kelvin;
-    const double x = t <= 7000.0
-        ? -4.6070e9 / (t * t * t) + 2.9678e6 / (t * t) + 0.09911e3 / t + 0.244063
-        : -2.0064e9 / (t * t * t) + 1.9018e6 / (t * t) + 0.24748e3 / t + 0.237040;
+    const double x = t <= 7000.0 ? -4.6070e9 / (t * t * t) + 2.9678e6 / (t * t) + 0.09911e3 / t + 0.244063
+                                 : -2.0064e9 / (t * t * t) + 1.9018e6 / (t * t) + 0.24748e3 / t + 0.237040;
     return Xy{x, -3.000 * x * x + 2.870 * x - 0.275};
 }
 

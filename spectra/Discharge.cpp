@@ -45,12 +45,13 @@ std::optional<Spectrum> metalHalide(BurnerKind kind, double kelvin)
     const double sodiumWidth = ceramic ? 16.0 : 10.0;
     const double infraredFraction = ceramic ? 0.12 : 0.08;
 
-    const Spectrum fixed = addScaled(atIlluminance(band(560.0, 140.0, 200.0), continuumShare),
-                                     atIlluminance(lines(kMercury), 0.08), 1.0);
+    const Spectrum fixed =
+        addScaled(atIlluminance(band(560.0, 140.0, 200.0), continuumShare), atIlluminance(lines(kMercury), 0.08), 1.0);
     const Spectrum red = addScaled(band(kSodiumD, sodiumWidth / 2, sodiumWidth * 0.8), lines(kHalideRed), 1.0);
     const std::optional<Spectrum> visible =
         blendToChromaticity(fixed, {lines(kHalideBlue), lines(kHalideGreen), red}, chromaticityAt(kelvin, 0.0));
-    if (!visible) return std::nullopt;
+    if (!visible)
+        return std::nullopt;
     const double power = integral(*visible) * infraredFraction / (1.0 - infraredFraction);
     return addScaled(*visible, unitArea(lines(kHalideInfrared)), power);
 }

@@ -25,7 +25,8 @@ std::optional<Spectrum> triPhosphorLamp(const TriPhosphorLamp& lamp)
 
     const std::optional<Spectrum> visible =
         blendToChromaticity(addScaled(mercury, continuum, 1.0), phosphors, chromaticityAt(lamp.kelvin, lamp.duv));
-    if (!visible) return std::nullopt;
+    if (!visible)
+        return std::nullopt;
     // The infrared lines as a fraction of the whole: p / (V + p) = fraction.
     const double power = integral(*visible) * kInfraredFraction / (1.0 - kInfraredFraction);
     return addScaled(*visible, unitArea(lines(kInfrared)), power);

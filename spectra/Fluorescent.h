@@ -19,7 +19,7 @@ namespace spectra {
 
 struct TriPhosphorLamp {
     double kelvin = 4000.0;
-    double duv = 0.0;            // distance above (+) or below (−) the Planckian locus, CIE 1960 uv
+    double duv = 0.0;             // distance above (+) or below (−) the Planckian locus, CIE 1960 uv
     double continuumShare = 0.05; // fraction of the illuminance from the broad continuum
 };
 

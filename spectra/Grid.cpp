@@ -25,8 +25,10 @@ Spectrum resample(std::span<const double> wavelengthsNm, std::span<const double>
     size_t k = 0; // table interval [k, k+1] holding the current wavelength
     for (int i = 0; i < kSamples; ++i) {
         const double nm = wavelengthNm(i);
-        if (nm < first - 1e-9 || nm > last + 1e-9) continue;
-        while (k + 2 < wavelengthsNm.size() && wavelengthsNm[k + 1] < nm) ++k;
+        if (nm < first - 1e-9 || nm > last + 1e-9)
+            continue;
+        while (k + 2 < wavelengthsNm.size() && wavelengthsNm[k + 1] < nm)
+            ++k;
         const double span = wavelengthsNm[k + 1] - wavelengthsNm[k];
         const double t = span > 0 ? std::clamp((nm - wavelengthsNm[k]) / span, 0.0, 1.0) : 0.0;
         out[size_t(i)] = values[k] + t * (values[k + 1] - values[k]);
@@ -37,21 +39,24 @@ Spectrum resample(std::span<const double> wavelengthsNm, std::span<const double>
 Spectrum scaled(const Spectrum& s, double factor)
 {
     Spectrum out;
-    for (size_t i = 0; i < s.size(); ++i) out[i] = s[i] * factor;
+    for (size_t i = 0; i < s.size(); ++i)
+        out[i] = s[i] * factor;
     return out;
 }
 
 Spectrum addScaled(const Spectrum& a, const Spectrum& b, double factor)
 {
     Spectrum out;
-    for (size_t i = 0; i < a.size(); ++i) out[i] = a[i] + factor * b[i];
+    for (size_t i = 0; i < a.size(); ++i)
+        out[i] = a[i] + factor * b[i];
     return out;
 }
 
 double integralFrom(const Spectrum& s, int first)
 {
     double sum = 0.0;
-    for (int i = std::max(first, 0); i < kSamples; ++i) sum += s[size_t(i)];
+    for (int i = std::max(first, 0); i < kSamples; ++i)
+        sum += s[size_t(i)];
     return sum * kStepNm;
 }
 

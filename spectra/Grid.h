@@ -33,7 +33,8 @@ template <typename F>
 Spectrum sampled(F f)
 {
     Spectrum s{};
-    for (int i = 0; i < kSamples; ++i) s[size_t(i)] = f(wavelengthNm(i));
+    for (int i = 0; i < kSamples; ++i)
+        s[size_t(i)] = f(wavelengthNm(i));
     return s;
 }
 

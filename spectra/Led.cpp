@@ -23,7 +23,8 @@ std::optional<Spectrum> whiteLed(const WhiteLed& led)
     if (led.redPeakNm <= 0.0) {
         std::optional<Spectrum> white = blendToTemperature(yellow, blue, led.kelvin);
         const std::optional<double> duv = white ? distanceFromLocus(chromaticity(tristimulus(*white))) : std::nullopt;
-        if (!duv || std::abs(*duv) > kMaxWhiteLedDuv) return std::nullopt;
+        if (!duv || std::abs(*duv) > kMaxWhiteLedDuv)
+            return std::nullopt;
         return white;
     }
     const Spectrum red = band(led.redPeakNm, led.redFwhmNm / 2, led.redFwhmNm / 2);
@@ -43,7 +44,8 @@ std::optional<Spectrum> violetPumpedLed(double pumpNm, double kelvin)
     std::optional<Spectrum> result;
     for (int round = 0; round < 4; ++round) {
         result = blendToChromaticity(scaled(violet, kPumpShare * radiantPerLux), phosphors, target);
-        if (!result) return std::nullopt;
+        if (!result)
+            return std::nullopt;
         radiantPerLux = integral(*result);
     }
     return result;

@@ -28,7 +28,8 @@ Spectrum withPlanckTail(const Spectrum& s, int lastSample, double kelvin)
     }
     const double factor = radiator > 0.0 ? tabulated / radiator : 0.0;
     Spectrum out = s;
-    for (int i = lastSample + 1; i < kSamples; ++i) out[size_t(i)] = factor * planckRelative(wavelengthNm(i), kelvin);
+    for (int i = lastSample + 1; i < kSamples; ++i)
+        out[size_t(i)] = factor * planckRelative(wavelengthNm(i), kelvin);
     return out;
 }
 

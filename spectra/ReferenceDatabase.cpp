@@ -27,21 +27,26 @@ void check(sqlite3* db, int code, const char* what)
         throw std::runtime_error(std::string(what) + ": " + sqlite3_errmsg(db));
 }
 
-void exec(sqlite3* db, const std::string& sql) { check(db, sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr), sql.c_str()); }
+void exec(sqlite3* db, const std::string& sql)
+{
+    check(db, sqlite3_exec(db, sql.c_str(), nullptr, nullptr, nullptr), sql.c_str());
+}
 
 double asFloat(double value) { return double(float(value)); }
 
 std::string spectraTableSql()
 {
     std::string sql = "CREATE TABLE Spectra (ID INTEGER PRIMARY KEY, X REAL, Y REAL, Z REAL";
-    for (int s = 0; s < kSamples; ++s) sql += ", S" + std::to_string(s) + " REAL";
+    for (int s = 0; s < kSamples; ++s)
+        sql += ", S" + std::to_string(s) + " REAL";
     return sql + ")";
 }
 
 std::string insertSql()
 {
     std::string sql = "INSERT INTO Spectra VALUES (?";
-    for (int c = 1; c < kLeadingColumns + kSamples; ++c) sql += ", ?";
+    for (int c = 1; c < kLeadingColumns + kSamples; ++c)
+        sql += ", ?";
     return sql + ")";
 }
 
@@ -73,7 +78,8 @@ void insertSources(sqlite3* db, const std::vector<const Source*>& sources)
         sqlite3_bind_double(raw, 2, asFloat(xyz.X));
         sqlite3_bind_double(raw, 3, asFloat(xyz.Y));
         sqlite3_bind_double(raw, 4, asFloat(xyz.Z));
-        for (int i = 0; i < kSamples; ++i) sqlite3_bind_double(raw, kLeadingColumns + 1 + i, asFloat(s[size_t(i)]));
+        for (int i = 0; i < kSamples; ++i)
+            sqlite3_bind_double(raw, kLeadingColumns + 1 + i, asFloat(s[size_t(i)]));
         check(db, sqlite3_step(raw), "insert spectrum");
         check(db, sqlite3_reset(raw), "reset insert");
     }
@@ -111,9 +117,11 @@ void writeReferenceDatabase(const std::string& path, float version, const std::v
     removeIfPresent(temporary.string() + "-journal");
     {
         sqlite3* raw = nullptr;
-        const int opened = sqlite3_open_v2(temporary.c_str(), &raw, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, nullptr);
+        const int opened =
+            sqlite3_open_v2(temporary.c_str(), &raw, SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE, nullptr);
         Connection db(raw);
-        if (opened != SQLITE_OK) throw std::runtime_error(temporary.string() + ": cannot create");
+        if (opened != SQLITE_OK)
+            throw std::runtime_error(temporary.string() + ": cannot create");
 
         exec(raw, "PRAGMA journal_mode=DELETE");
         exec(raw, "BEGIN");
@@ -125,7 +133,8 @@ void writeReferenceDatabase(const std::string& path, float version, const std::v
         insertNames(raw, sources);
         exec(raw, "COMMIT");
         exec(raw, "VACUUM");
-        if (sqlite3_close(db.release()) != SQLITE_OK) throw std::runtime_error(temporary.string() + ": close failed");
+        if (sqlite3_close(db.release()) != SQLITE_OK)
+            throw std::runtime_error(temporary.string() + ": close failed");
     }
     std::filesystem::rename(temporary, path);
 }

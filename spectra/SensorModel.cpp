@@ -85,8 +85,8 @@ SensorModel loadSensorModel(const std::filesystem::path& file)
                            std::to_string(cells.size()));
         double nm = 0.0;
         if (!parseNumber(cells[0], nm) || std::fabs(nm - wavelengthNm(row)) > 1e-6)
-            fail(line, "expected wavelength " + std::to_string(int(wavelengthNm(row))) + " nm, found \"" +
-                           cells[0] + "\"");
+            fail(line,
+                 "expected wavelength " + std::to_string(int(wavelengthNm(row))) + " nm, found \"" + cells[0] + "\"");
         for (size_t c = 0; c < sensor.channelNames.size(); ++c)
             if (!parseNumber(cells[c + 1], sensor.channels[c][size_t(row)]))
                 fail(line, "channel " + sensor.channelNames[c] + ": \"" + cells[c + 1] + "\" is not a number");

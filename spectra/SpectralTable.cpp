@@ -27,7 +27,8 @@ double requiredNumber(cmsHANDLE it8, const char* key, const std::string& path)
 SpectralTable loadSpectralTable(const std::string& path)
 {
     It8Handle it8(cmsIT8LoadFromFile(nullptr, path.c_str()));
-    if (!it8) throw std::runtime_error(path + ": cannot read CGATS file");
+    if (!it8)
+        throw std::runtime_error(path + ": cannot read CGATS file");
 
     const double start = requiredNumber(it8.get(), "SPECTRAL_START_NM", path);
     const double end = requiredNumber(it8.get(), "SPECTRAL_END_NM", path);

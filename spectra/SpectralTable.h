@@ -9,7 +9,7 @@ namespace spectra {
 
 // One or more spectra tabulated on a common, evenly spaced wavelength range.
 struct SpectralTable {
-    std::vector<double> wavelengthsNm;      // SPECTRAL_START_NM .. SPECTRAL_END_NM, SPECTRAL_BANDS values
+    std::vector<double> wavelengthsNm;     // SPECTRAL_START_NM .. SPECTRAL_END_NM, SPECTRAL_BANDS values
     std::vector<std::vector<double>> sets; // one row of the data block per set
 };
 

@@ -51,14 +51,30 @@ std::vector<Recipe> recipes()
 {
     return {
         // White LEDs: pumps, phosphor peaks and widths, and temperatures off both grids.
-        {"test-led-447-567-118-4200K", "led", [] { return whiteLed({447, 567, 118, 0, 0, 4200}); }},
-        {"test-led-453-563-122-5300K", "led", [] { return whiteLed({453, 563, 122, 0, 0, 5300}); }},
-        {"test-led-442-557-95-6200K", "led", [] { return whiteLed({442, 557, 95, 0, 0, 6200}); }},
-        {"test-led-442-573-118-3800K", "led", [] { return whiteLed({442, 573, 118, 0, 0, 3800}); }},
+        {"test-led-447-567-118-4200K", "led",
+         [] {
+             return whiteLed({447, 567, 118, 0, 0, 4200});
+         }},
+        {"test-led-453-563-122-5300K", "led",
+         [] {
+             return whiteLed({453, 563, 122, 0, 0, 5300});
+         }},
+        {"test-led-442-557-95-6200K", "led",
+         [] {
+             return whiteLed({442, 557, 95, 0, 0, 6200});
+         }},
+        {"test-led-442-573-118-3800K", "led",
+         [] {
+             return whiteLed({442, 573, 118, 0, 0, 3800});
+         }},
         {"test-ledr-448-538-102-r622w70-3300K", "led-red",
-         [] { return whiteLed({448, 538, 102, 622, 70, 3300}); }},
+         [] {
+             return whiteLed({448, 538, 102, 622, 70, 3300});
+         }},
         {"test-ledr-452-550-110-r640w20-2400K", "led-red",
-         [] { return whiteLed({452, 550, 110, 640, 20, 2400}); }},
+         [] {
+             return whiteLed({452, 550, 110, 640, 20, 2400});
+         }},
         {"test-ledv-410-4500K", "led-violet", [] { return violetPumpedLed(410, 4500); }},
         // Daylight between the sampled temperatures, and tabulated CIE daylights.
         {"test-daylight-5450K", "daylight", [] { return cieDaylight(5450); }},
@@ -71,9 +87,18 @@ std::vector<Recipe> recipes()
         {"test-incandescent-dimmed-2250K", "planck", [] { return planck(2250); }},
         {"test-halogen-3150K", "planck", [] { return planck(3150); }},
         // Discharge lamps off the grid.
-        {"test-tri-4200K-duvp3-c10", "fluorescent", [] { return triPhosphorLamp({4200, 0.003, 0.10}); }},
-        {"test-tri-3300K-duvm3-c8", "fluorescent", [] { return triPhosphorLamp({3300, -0.003, 0.08}); }},
-        {"test-hps-b10.5-ir15", "sodium", [] { return highPressureSodium({10.5, 1.5}); }},
+        {"test-tri-4200K-duvp3-c10", "fluorescent",
+         [] {
+             return triPhosphorLamp({4200, 0.003, 0.10});
+         }},
+        {"test-tri-3300K-duvm3-c8", "fluorescent",
+         [] {
+             return triPhosphorLamp({3300, -0.003, 0.08});
+         }},
+        {"test-hps-b10.5-ir15", "sodium",
+         [] {
+             return highPressureSodium({10.5, 1.5});
+         }},
         {"test-mh-ceramic-4200K", "metal-halide", [] { return metalHalide(BurnerKind::Ceramic, 4200); }},
         // Mixtures at other ratios and with other parts.
         {"test-mix-d55-ledr2700-35", "mix-led",
@@ -81,7 +106,9 @@ std::vector<Recipe> recipes()
              return mix(cieDaylight(5503), solved(whiteLed({450, 545, 105, 630, 90, 2700}), "ledr2700"), 0.35);
          }},
         {"test-mix-a-tri4000-50", "mix-incandescent",
-         [] { return mix(cieA(), solved(triPhosphorLamp({4000, 0.0, 0.05}), "tri4000"), 0.50); }},
+         [] {
+             return mix(cieA(), solved(triPhosphorLamp({4000, 0.0, 0.05}), "tri4000"), 0.50);
+         }},
         {"test-mix-d65-halogen3150-45", "mix-incandescent", [] { return mix(cieD65(), planck(3150), 0.45); }},
         {"test-mix-led4000-ledr2700-50", "mix-led",
          [] {

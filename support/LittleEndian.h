@@ -17,16 +17,14 @@ template <typename T>
 concept Field = std::is_arithmetic_v<T>;
 
 // True when [offset, offset + size) lies inside a buffer of `length` bytes.
-constexpr bool fits(size_t length, size_t offset, size_t size)
-{
-    return offset <= length && size <= length - offset;
-}
+constexpr bool fits(size_t length, size_t offset, size_t size) { return offset <= length && size <= length - offset; }
 
 template <Field T>
 T decode(const uint8_t* p)
 {
-    using U = std::conditional_t<sizeof(T) == 1, uint8_t,
-              std::conditional_t<sizeof(T) == 2, uint16_t, std::conditional_t<sizeof(T) == 4, uint32_t, uint64_t>>>;
+    using U = std::conditional_t<
+        sizeof(T) == 1, uint8_t,
+        std::conditional_t<sizeof(T) == 2, uint16_t, std::conditional_t<sizeof(T) == 4, uint32_t, uint64_t>>>;
     U u = 0;
     for (size_t i = 0; i < sizeof(T); ++i)
         u |= U(p[i]) << (8 * i);
@@ -38,8 +36,9 @@ T decode(const uint8_t* p)
 template <Field T>
 void encode(uint8_t* p, T value)
 {
-    using U = std::conditional_t<sizeof(T) == 1, uint8_t,
-              std::conditional_t<sizeof(T) == 2, uint16_t, std::conditional_t<sizeof(T) == 4, uint32_t, uint64_t>>>;
+    using U = std::conditional_t<
+        sizeof(T) == 1, uint8_t,
+        std::conditional_t<sizeof(T) == 2, uint16_t, std::conditional_t<sizeof(T) == 4, uint32_t, uint64_t>>>;
     U u;
     std::memcpy(&u, &value, sizeof(T));
     for (size_t i = 0; i < sizeof(T); ++i)

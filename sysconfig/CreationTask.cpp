@@ -10,10 +10,10 @@
 // database can appear between the check, the write and dbReady. The lock is
 // recursive, so the in-place task of a synchronous build runs under the lock
 // its caller already holds.
+#include "calibration/Calibration.h"
 #include "lightdb/LDBM.h"
 #include "support/Assert.h"
 #include "support/Log.h"
-#include "calibration/Calibration.h"
 #include "sysconfig/DatabaseBuild.h"
 
 #include <mutex>
@@ -37,9 +37,9 @@ void writeCache(Calibration& calibration, const SpectralDatabasePtr& db, const C
         VLOG_INFO("A newer database has been published; this one's cache is not written.\n");
         return;
     }
-    const LDBMResult code = LDBMCreateSmallDB(&db->dbInfo, db->dbXYZ.data(), db->dbChannelResponses.data(),
-                                              keys.orientation, keys.algo, keys.channelCount, keys.chipId,
-                                              kSmallDBVersion);
+    const LDBMResult code =
+        LDBMCreateSmallDB(&db->dbInfo, db->dbXYZ.data(), db->dbChannelResponses.data(), keys.orientation, keys.algo,
+                          keys.channelCount, keys.chipId, kSmallDBVersion);
     if (code != LDBMResult::Ok) {
         VLOG_ERROR("Failed to create small DB %d\n", LDBMCode(code));
         return;
@@ -59,8 +59,9 @@ void startCreationTask(Calibration& calibration, bool asyncCreate, SpectralDatab
         writeCache(calibration, db, keys);
         return;
     }
-    calibration.host().dispatchRetained(dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_DEFAULT, 0),
-                            [&calibration, db = std::move(db), keys] { writeCache(calibration, db, keys); });
+    calibration.host().dispatchRetained(
+        dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_DEFAULT, 0),
+        [&calibration, db = std::move(db), keys] { writeCache(calibration, db, keys); });
 }
 
 } // namespace sysconfig

@@ -1,10 +1,11 @@
 // The common end of a configuration-supplied build, and the Matrices record
 // that carries a calibration entry's spectra into the reference scan.
+#include "sysconfig/DatabaseBuild.h"
+
+#include "calibration/Calibration.h"
 #include "lightdb/LDBM.h"
 #include "support/Assert.h"
 #include "support/Log.h"
-#include "calibration/Calibration.h"
-#include "sysconfig/DatabaseBuild.h"
 
 namespace sysconfig {
 

@@ -1,9 +1,9 @@
 // The generic four-channel spectrum step: channel spectra and weights from the
 // entry's spectrum block, optional infrared compensation from
 // "alsAuxCalibration", then the reference scan.
+#include "calibration/Calibration.h"
 #include "support/LittleEndian.h"
 #include "support/Log.h"
-#include "calibration/Calibration.h"
 #include "sysconfig/DatabaseBuild.h"
 
 #include <algorithm>
@@ -42,7 +42,8 @@ void applyInfraredCompensation(const Calibration& calibration, CFTypeRef auxBlob
         VLOG_ERROR("alsAuxCalibration of %ld bytes is shorter than its header.\n", long(bytes.size()));
         return;
     }
-    const auto entry = findCalibrationEntry(bytes, header->entryCount, calibration.unit().orientation, "alsAuxCalibration");
+    const auto entry =
+        findCalibrationEntry(bytes, header->entryCount, calibration.unit().orientation, "alsAuxCalibration");
     if (!entry)
         return;
     if (entry->bytes.size() < aux::kEntrySize) {

@@ -2,11 +2,12 @@
 // orientation becomes the driver's calibration record and the source of the
 // per-chip database, which is loaded from its cache or built from the entry's
 // channel spectra.
-#include "support/CFOwned.h"
+#include "sysconfig/SysConfigCalibration.h"
+
 #include "lightdb/CachedDB.h"
 #include "lightdb/LDBM.h"
+#include "support/CFOwned.h"
 #include "support/Log.h"
-#include "sysconfig/SysConfigCalibration.h"
 
 #include "calibration/Calibration.h"
 #include "sysconfig/DatabaseBuild.h"
@@ -26,14 +27,14 @@ enum class PushOutcome { Failed, Set, NoService };
 // A blob found on the service's registry entry or one of its ancestors.
 CFOwned<CFTypeRef> copyRegistryBlob(io_registry_entry_t entry, CFStringRef key)
 {
-    return CFOwned<CFTypeRef>(IORegistryEntrySearchCFProperty(entry, kIOServicePlane, key, kCFAllocatorDefault,
-                                                              kIORegistryIterateRecursively |
-                                                                  kIORegistryIterateParents));
+    return CFOwned<CFTypeRef>(IORegistryEntrySearchCFProperty(
+        entry, kIOServicePlane, key, kCFAllocatorDefault, kIORegistryIterateRecursively | kIORegistryIterateParents));
 }
 
 // The generic entry's record; also takes the entry's channel count and the
 // algorithm override, as the driver will work with them.
-CFDataRef createGenericRecord(Calibration& calibration, const CalibrationEntry& entry, const ALSCalibrationHeader& header)
+CFDataRef createGenericRecord(Calibration& calibration, const CalibrationEntry& entry,
+                              const ALSCalibrationHeader& header)
 {
     const auto layout = genericEntryLayout(entry.bytes, header.revision);
     if (!layout)
@@ -51,10 +52,10 @@ CFDataRef createGenericRecord(Calibration& calibration, const CalibrationEntry& 
 PushOutcome pushCalibrationRecord(Calibration& calibration, CFDataRef blob, const ALSCalibrationHeader& header,
                                   const CalibrationEntry& entry)
 {
-    CFOwned<CFDataRef> record = entry.subHeader.chipType == kChipTypeVD6286
-                                    ? processSysConfigSensorCalibrationVD6286(calibration, blob, entry.offset, header,
-                                                                              entry.subHeader)
-                                    : CFOwned<CFDataRef>(createGenericRecord(calibration, entry, header));
+    CFOwned<CFDataRef> record =
+        entry.subHeader.chipType == kChipTypeVD6286
+            ? processSysConfigSensorCalibrationVD6286(calibration, blob, entry.offset, header, entry.subHeader)
+            : CFOwned<CFDataRef>(createGenericRecord(calibration, entry, header));
     if (!record)
         return PushOutcome::Failed;
     if (!calibration.host().service())
@@ -73,7 +74,8 @@ bool loadOrBuildDatabase(Calibration& calibration, bool asyncCreate, CFDataRef b
 {
     const unsigned channels = calibration.unit().numberOfChannels;
     auto db = std::make_shared<SpectralDatabase>();
-    const CacheKey key{int(calibration.unit().orientation.load()), calibration.unit().smallDBVersion.load(), calibration.unit().chipId.load()};
+    const CacheKey key{int(calibration.unit().orientation.load()), calibration.unit().smallDBVersion.load(),
+                       calibration.unit().chipId.load()};
     if (processCachedDB(key, int(channels), BigDBTypeDefault, *db)) {
         calibration.unit().algoVersion = uint8_t(db->dbInfo.algo);
         VLOG_DEFAULT("Found cached DB\n");
@@ -134,11 +136,13 @@ bool processSysConfigCalibration(Calibration& calibration, bool asyncCreate, boo
     VLOG_INFO("supported calibration version %d,%d with size %d\n", int(header->version), int(header->revision),
               int(header->totalSize));
 
-    const auto entry = findCalibrationEntry(bytes, header->entryCount, calibration.unit().orientation, "alsCalibration");
+    const auto entry =
+        findCalibrationEntry(bytes, header->entryCount, calibration.unit().orientation, "alsCalibration");
     if (!entry)
         return false;
-    VLOG_INFO("Found calibration for orientation = %d, senzorType = %d, chipType = %d \n", int(calibration.unit().orientation.load()),
-              int(entry->subHeader.sensorType), int(entry->subHeader.chipType));
+    VLOG_INFO("Found calibration for orientation = %d, senzorType = %d, chipType = %d \n",
+              int(calibration.unit().orientation.load()), int(entry->subHeader.sensorType),
+              int(entry->subHeader.chipType));
 
     bool result = false;
     if (pushCalibration) {

@@ -110,7 +110,7 @@ struct GenericEntryLayout {
     size_t channelBlockSize = 0;
     size_t spectrumOffset = 0; // from the start of the entry
     size_t spectrumSize = 0;
-    size_t spectraOffset = 0;  // from the start of the spectrum block
+    size_t spectraOffset = 0; // from the start of the spectrum block
 };
 
 // The layout of a generic entry, or nothing (with an error line) when it

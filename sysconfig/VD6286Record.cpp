@@ -14,7 +14,7 @@ using namespace sysconfig;
 
 namespace {
 
-constexpr unsigned kFixedGainScales = 4; // the first four gain scales are 2.0 for this chip
+constexpr unsigned kFixedGainScales = 4;   // the first four gain scales are 2.0 for this chip
 constexpr uint16_t kGainScaleTwo = 0x8000; // 2.0 with 14 fraction bits
 
 // A channel block: the first four gain scales are fixed, the entry's follow.
@@ -40,9 +40,10 @@ CFDataRef createRecord(std::span<const uint8_t> entry, uint8_t entryCount, unsig
         record.setCctCoeff(k, float(le::get<int32_t>(entry, vd6286::kCctCoefficients + 4 * k)));
     }
     for (unsigned c = 0; c < nChannels; ++c)
-        record.setChannelBlock(c, vd6286ChannelBlock(entry.subspan(vd6286::kChannelBlocks + vd6286::kChannelBlockSize * c,
-                                                                   vd6286::kChannelBlockSize),
-                                                     nGains));
+        record.setChannelBlock(c,
+                               vd6286ChannelBlock(entry.subspan(vd6286::kChannelBlocks + vd6286::kChannelBlockSize * c,
+                                                                vd6286::kChannelBlockSize),
+                                                  nGains));
     return record.createData();
 }
 

@@ -11,7 +11,7 @@ using namespace sysconfig;
 
 bool processSysConfigSpectrumVD6286(Calibration& calibration, bool asyncCreate, CFDataRef blob, long entryOffset,
                                     const ALSCalibrationSubHeader& subHeader, Matrices& matrices,
-                                                   const std::shared_ptr<SpectralDatabase>& build)
+                                    const std::shared_ptr<SpectralDatabase>& build)
 {
     const auto located = vd6286::entryAt(blob, entryOffset, subHeader.entrySize);
     if (!located)

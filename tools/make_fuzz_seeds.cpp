@@ -185,7 +185,8 @@ Bytes vd6287v1(uint8_t count)
     const size_t moves[][3] = {{0, 0, 7}, {11, 9, 6}, {17, 19, 4}, {21, 23, 108}, {141, 143, 95}, {238, 239, 4812}};
     for (unsigned k = 0; k < v::kBlobs; ++k) {
         for (const auto& m : moves)
-            std::copy_n(v3.begin() + long(v::v3BlobOffset(k) + m[0]), m[2], b.begin() + long(v::v1BlobOffset(k) + m[1]));
+            std::copy_n(v3.begin() + long(v::v3BlobOffset(k) + m[0]), m[2],
+                        b.begin() + long(v::v1BlobOffset(k) + m[1]));
         const size_t o = v::v1BlobOffset(k);
         u8(b, o + v::v1blob::count, count);
         for (unsigned m = 0; m < 4; ++m) {
@@ -364,8 +365,8 @@ void databaseSeeds()
 {
     const std::string reference = "@ref\nT Info version sources\nR 1.5 3\n" + spectraRows(3, 12);
     seed("light_databases", "reference", framed({0x03}, text(reference)));
-    seed("light_databases", "reference2-five-channels", framed({0x0C}, text("@ref2\nT Info version sources\nR 2 3\n" +
-                                                                            spectraRows(3, 20))));
+    seed("light_databases", "reference2-five-channels",
+         framed({0x0C}, text("@ref2\nT Info version sources\nR 2 3\n" + spectraRows(3, 20))));
     const std::string cache = "@cache\nT Info version smallversion sources orientation algo chipID\n"
                               "R 1.5 1.1 3 1 3 439041101\nT RR R G B C\nR 1 2 3 4\nR 2 3 4 5\nR 3 4 5 6\n"
                               "T XX X Y Z\nR 0.3 0.35 0.3\nR 0.4 0.35 0.25\nR 0.5 0.3 0.2\n";
@@ -381,19 +382,20 @@ void databaseSeeds()
     for (int i = 0; i < 3; ++i)
         spectraSql += "INSERT INTO Spectra VALUES (" + std::to_string(i) + ", 0.3, 0.35, 0.3, 1, 2, 3, 4);";
     const Bytes rawReference = sqliteFile("CREATE TABLE Info (version REAL, sources INTEGER, columns INTEGER, "
-                                          "samples INTEGER); INSERT INTO Info VALUES (1.5, 3, 8, 4);" + spectraSql);
+                                          "samples INTEGER); INSERT INTO Info VALUES (1.5, 3, 8, 4);" +
+                                          spectraSql);
     Bytes raw = framed({0x03}, text("@rawref\n"));
     raw.insert(raw.end(), rawReference.begin(), rawReference.end());
     seed("light_databases", "raw-reference", raw);
-    const Bytes rawCache = sqliteFile(
-        "CREATE TABLE Info (version Single, smallversion Single, sources Long, orientation Long, algo Long);"
-        "INSERT INTO Info VALUES (1.5, 1.1, 6, 1, 3);"
-        "CREATE TABLE RR (R Single, G Single, B Single, C Single);"
-        "INSERT INTO RR VALUES (1,2,3,4); INSERT INTO RR VALUES (2,3,4,5); INSERT INTO RR VALUES (3,4,5,6);"
-        "INSERT INTO RR VALUES (1,1,1,1); INSERT INTO RR VALUES (2,2,2,2); INSERT INTO RR VALUES (3,3,3,3);"
-        "CREATE TABLE XX (X Single, Y Single, Z Single);"
-        "INSERT INTO XX VALUES (1,1,1); INSERT INTO XX VALUES (2,2,2); INSERT INTO XX VALUES (3,3,3);"
-        "INSERT INTO XX VALUES (4,4,4); INSERT INTO XX VALUES (5,5,5); INSERT INTO XX VALUES (6,6,6);");
+    const Bytes rawCache =
+        sqliteFile("CREATE TABLE Info (version Single, smallversion Single, sources Long, orientation Long, algo Long);"
+                   "INSERT INTO Info VALUES (1.5, 1.1, 6, 1, 3);"
+                   "CREATE TABLE RR (R Single, G Single, B Single, C Single);"
+                   "INSERT INTO RR VALUES (1,2,3,4); INSERT INTO RR VALUES (2,3,4,5); INSERT INTO RR VALUES (3,4,5,6);"
+                   "INSERT INTO RR VALUES (1,1,1,1); INSERT INTO RR VALUES (2,2,2,2); INSERT INTO RR VALUES (3,3,3,3);"
+                   "CREATE TABLE XX (X Single, Y Single, Z Single);"
+                   "INSERT INTO XX VALUES (1,1,1); INSERT INTO XX VALUES (2,2,2); INSERT INTO XX VALUES (3,3,3);"
+                   "INSERT INTO XX VALUES (4,4,4); INSERT INTO XX VALUES (5,5,5); INSERT INTO XX VALUES (6,6,6);");
     raw = framed({0x03}, text("@rawcache\n"));
     raw.insert(raw.end(), rawCache.begin(), rawCache.end());
     seed("light_databases", "raw-cache", raw);
@@ -410,8 +412,7 @@ void factorySeeds()
         const uint8_t channels = device == x::kDeviceSixChannel ? 6 : device == x::kDeviceFourChannelA ? 4 : 5;
         seed("factory_layouts", "xwcl-device-" + std::to_string(device), framed({1, 0}, xwcl(device, 1, 0, channels)));
     }
-    seed("factory_layouts", "xwcl-two-entries-chip-type-2",
-         framed({1, 2}, xwcl(x::kDeviceFourChannelB, 2, 2, 4)));
+    seed("factory_layouts", "xwcl-two-entries-chip-type-2", framed({1, 2}, xwcl(x::kDeviceFourChannelB, 2, 2, 4)));
     seed("factory_layouts", "xwcl-six-channels-chip-type-1", framed({1, 1}, xwcl(x::kDeviceSixChannel, 2, 1, 6)));
     seed("factory_layouts", "vd6287-v1", framed({2, 0}, vd6287v1(3)));
     seed("factory_layouts", "vd6287-v1-no-entries", framed({2, 0}, vd6287v1(255)));
@@ -452,7 +453,8 @@ void sampleSeeds()
 void propertySeeds()
 {
     // key byte, value tag, value bytes (see client_properties.cpp).
-    seed("client_properties", "rgbc-array", {4, 0, 0, 11, 4, 5, 1, 0, 0, 0, 5, 2, 0, 0, 0, 5, 3, 0, 0, 0, 5, 4, 0, 0, 0});
+    seed("client_properties", "rgbc-array",
+         {4, 0, 0, 11, 4, 5, 1, 0, 0, 0, 5, 2, 0, 0, 0, 5, 3, 0, 0, 0, 5, 4, 0, 0, 0});
     seed("client_properties", "rgbc-off", {4, 0, 0, 5, 0, 0, 0, 0});
     Bytes chromaticity = {4, 0, 1, 11, 3, 8};
     f64(chromaticity, chromaticity.size(), 0.3127);
@@ -472,18 +474,21 @@ void propertySeeds()
 
 void hostInputSeeds()
 {
-    seed("event_input", "csv", framed({0, 4}, text("# samples\nts,lux,c0,c1,c2,c3\n0,100,50,80,40,200\n"
-                                                    "0.1,120,60,90,45,230\n!set RGBCOverride=[1,2,3,4]\n!copy\n"
-                                                    "0.2,,,,,\n")));
+    seed("event_input", "csv",
+         framed({0, 4}, text("# samples\nts,lux,c0,c1,c2,c3\n0,100,50,80,40,200\n"
+                             "0.1,120,60,90,45,230\n!set RGBCOverride=[1,2,3,4]\n!copy\n"
+                             "0.2,,,,,\n")));
     seed("event_input", "csv-all-fields",
-         framed({0, 5}, text("status,sampleChannelCount,sampleOrientation,nits,integrationTime,reportInterval,gain,lux,"
-                             "rawLux,c0,c1,c2,c3,c4,c5,cct,timestamp,subsamples,mode,xTalk0,xTalk1,xTalk2,xTalk3,"
-                             "xTalk4,xyzInRecord,xyzSensorX,xyzSensorY,xyzSensorZ,filteredLux,filteredLuxValid,ts\n"
-                             "1,5,1,300,100,100,2.5,150,149,1,2,3,4,5,6,5000,7,2,1,1,2,3,4,5,1,0.3,0.35,0.3,151,1,3\n")));
-    seed("event_input", "json-lines", framed({1, 4}, text("{\"lux\": 100, \"c0\": 50, \"c3\": 200, \"ts\": 0.5}\n"
-                                                          "{\"set\": {\"ChromaticityOverride\": [0.31, 0.33]}}\n"
-                                                          "{\"copy\": true}\n{\"set\": {\"blob\": {\"data\": \"0a0b\"}}}\n"
-                                                          "{\"set\": {\"file\": {\"dataFile\": \"blob.bin\"}}}\n")));
+         framed({0, 5},
+                text("status,sampleChannelCount,sampleOrientation,nits,integrationTime,reportInterval,gain,lux,"
+                     "rawLux,c0,c1,c2,c3,c4,c5,cct,timestamp,subsamples,mode,xTalk0,xTalk1,xTalk2,xTalk3,"
+                     "xTalk4,xyzInRecord,xyzSensorX,xyzSensorY,xyzSensorZ,filteredLux,filteredLuxValid,ts\n"
+                     "1,5,1,300,100,100,2.5,150,149,1,2,3,4,5,6,5000,7,2,1,1,2,3,4,5,1,0.3,0.35,0.3,151,1,3\n")));
+    seed("event_input", "json-lines",
+         framed({1, 4}, text("{\"lux\": 100, \"c0\": 50, \"c3\": 200, \"ts\": 0.5}\n"
+                             "{\"set\": {\"ChromaticityOverride\": [0.31, 0.33]}}\n"
+                             "{\"copy\": true}\n{\"set\": {\"blob\": {\"data\": \"0a0b\"}}}\n"
+                             "{\"set\": {\"file\": {\"dataFile\": \"blob.bin\"}}}\n")));
 
     seed("device_description", "generated-sysconfig", text(R"({"name": "fuzz", "service": {"registryID": 4097,
   "properties": {"IONameMatched": "als,ct711", "NumberOfChannels": 4, "ALSSensorType": 1,
@@ -511,7 +516,8 @@ uint8_t storeClass(const std::string& name) { return name == "XwCl" ? 1 : name =
 
 int serviceInt(const nlohmann::json& device, const char* key, int fallback)
 {
-    const auto& properties = device.value("service", nlohmann::json::object()).value("properties", nlohmann::json::object());
+    const auto& properties =
+        device.value("service", nlohmann::json::object()).value("properties", nlohmann::json::object());
     return properties.contains(key) && properties[key].is_number_integer() ? properties[key].get<int>() : fallback;
 }
 
@@ -541,7 +547,8 @@ void deviceSeeds(const fs::path& data)
         const Bytes calibration = readFile(folder / "registry" / "alsCalibration.bin");
         if (!calibration.empty()) {
             const Bytes aux = readFile(folder / "registry" / "alsAuxCalibration.bin");
-            seed("sysconfig_blobs", name, sysconfigInput(uint8_t(aux.empty() ? 0x06 : 0x0E), channels, calibration, aux));
+            seed("sysconfig_blobs", name,
+                 sysconfigInput(uint8_t(aux.empty() ? 0x06 : 0x0E), channels, calibration, aux));
         }
     }
 }

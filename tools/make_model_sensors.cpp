@@ -41,7 +41,7 @@ struct Passband {
 };
 
 struct Leak {
-    double level;  // transmission reached deep in the infrared
+    double level;   // transmission reached deep in the infrared
     double onsetNm; // where half of it is reached
     double widthNm; // logistic scale of the rise
 };
@@ -94,7 +94,8 @@ SensorModel build(const SensorShape& shape)
     SensorModel sensor;
     for (const ChannelShape& c : shape.channels) {
         sensor.channelNames.emplace_back(c.name);
-        sensor.channels.push_back(sampled([&](double nm) { return quantumResponse(shape.silicon, nm) * transmission(c, nm); }));
+        sensor.channels.push_back(
+            sampled([&](double nm) { return quantumResponse(shape.silicon, nm) * transmission(c, nm); }));
     }
     const double peak = sensor.peak();
     for (Spectrum& s : sensor.channels)
@@ -148,8 +149,9 @@ const std::vector<SensorShape>& shapes()
 
 std::string csvOf(const SensorShape& shape)
 {
-    return sensorModelCsv(build(shape), {shape.description, "A model, not a measured part; written by make_model_sensors.",
-                                         "Relative sensitivity per channel on the 300-1100 nm grid, peak 1."});
+    return sensorModelCsv(build(shape),
+                          {shape.description, "A model, not a measured part; written by make_model_sensors.",
+                           "Relative sensitivity per channel on the 300-1100 nm grid, peak 1."});
 }
 
 std::string readFile(const std::filesystem::path& path)

@@ -35,7 +35,8 @@ void list()
                         integralFrom(s.spectrum, kNirTailStart) / integral(s.spectrum));
             ++perFamily[s.family];
         }
-        for (const auto& [family, count] : perFamily) std::printf("%s family %-17s %d\n", file.fileName, family.c_str(), count);
+        for (const auto& [family, count] : perFamily)
+            std::printf("%s family %-17s %d\n", file.fileName, family.c_str(), count);
         std::printf("%s total %zu\n", file.fileName, sources.size());
     }
 }

@@ -19,9 +19,9 @@
 
 #include <algorithm>
 #include <cmath>
-#include <cstdlib>
 #include <cstdint>
 #include <cstdio>
+#include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <iterator>
@@ -197,9 +197,9 @@ struct XwClHeader {
 Json xwcl(const XwClHeader& h, std::vector<Json> entries)
 {
     Json f;
-    f["header"] = Json{{"versionMajor", h.versionMajor}, {"versionMinor", h.versionMinor},
+    f["header"] = Json{{"versionMajor", h.versionMajor},   {"versionMinor", h.versionMinor},
                        {"entrySelector", h.entrySelector}, {"chipID", h.chipID},
-                       {"deviceID", h.deviceID}, {"chipType", h.chipType}};
+                       {"deviceID", h.deviceID},           {"chipType", h.chipType}};
     f["entries"] = std::move(entries);
     return record("factory-xwcl", f["entries"].size() == 1 ? 5156 : 10236, f);
 }
@@ -333,8 +333,8 @@ constexpr size_t kHeaderSize = 8;
 const std::vector<double> kMeasuredTailLoss = {1.25, 1.30, 1.35, 1.20};
 
 // A generic (four-channel) entry; its size follows from the gains and the revision.
-Json genericEntry(const SensorModel& sensor, unsigned orientation, unsigned revision, unsigned gains,
-                  double luxFactor, const std::vector<double>& tailLoss = {})
+Json genericEntry(const SensorModel& sensor, unsigned orientation, unsigned revision, unsigned gains, double luxFactor,
+                  const std::vector<double>& tailLoss = {})
 {
     Json e;
     const size_t channels = sensor.channelCount();
@@ -465,10 +465,12 @@ std::vector<SampleUnit> sampleUnits(const fs::path& sensors)
         {"vd6287-v3", {store("XwCM", vd6287v3(colour5))}},
         // Entries for orientations 3 and 1: the unit (orientation 1) uses the second.
         {"sysconfig-r0",
-         {blob("alsCalibration", alsCalibration(0, {genericEntry(rgbc4, 3, 0, 9, 0.9), genericEntry(rgbc4, 1, 0, 9, 1.0)}))}},
+         {blob("alsCalibration",
+               alsCalibration(0, {genericEntry(rgbc4, 3, 0, 9, 0.9), genericEntry(rgbc4, 1, 0, 9, 1.0)}))}},
         {"sysconfig-r1", {blob("alsCalibration", alsCalibration(1, {genericEntry(rgbc4, 1, 1, 8, 1.0)}))}},
         {"sysconfig-aux",
-         {blob("alsCalibration", alsCalibration(1, {auxGeneric})), blob("alsAuxCalibration", alsAuxCalibration(auxGeneric))}},
+         {blob("alsCalibration", alsCalibration(1, {auxGeneric})),
+          blob("alsAuxCalibration", alsAuxCalibration(auxGeneric))}},
         {"sysconfig-vd6286", {blob("alsCalibration", alsCalibration(0, {vd6286Entry(colour5)}))}},
     };
 }
@@ -572,7 +574,8 @@ int main(int argc, char** argv)
                     writeFile(dir / r.json, out.json);
                     continue;
                 }
-                for (const auto& [path, content] : {std::pair{dir / r.binary, out.bytes}, std::pair{dir / r.json, out.json}}) {
+                for (const auto& [path, content] :
+                     {std::pair{dir / r.binary, out.bytes}, std::pair{dir / r.json, out.json}}) {
                     if (readFile(path) != content) {
                         std::fprintf(stderr, "make_sample_units: %s differs from its source\n", path.c_str());
                         ++differing;

@@ -8,8 +8,8 @@
 // queued work left over from the input before.
 #pragma once
 
-#include "plugin/VantishPlugIn.h"
 #include "common/PlugInHolder.h"
+#include "plugin/VantishPlugIn.h"
 
 #include <cstddef>
 #include <cstdint>

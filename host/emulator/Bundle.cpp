@@ -115,9 +115,8 @@ std::string defaultBundleFolder()
     std::error_code ec;
     const fs::path exe = fs::read_symlink("/proc/self/exe", ec);
     if (!ec) {
-        for (const fs::path& candidate :
-             {exe.parent_path().parent_path() / "Vantish.plugin",
-              exe.parent_path().parent_path() / "lib" / "vantish" / "Vantish.plugin"}) {
+        for (const fs::path& candidate : {exe.parent_path().parent_path() / "Vantish.plugin",
+                                          exe.parent_path().parent_path() / "lib" / "vantish" / "Vantish.plugin"}) {
             if (fs::exists(candidate / "Info.json"))
                 return candidate.string();
         }

@@ -63,8 +63,8 @@ CFTypeRef createPropertyValue(const nlohmann::json& value, const fs::path& folde
     case nlohmann::json::value_t::string:
         // Text that did not come through the JSON parser (a bare word after
         // "KEY=") may not be UTF-8, and then no CF string can hold it.
-        if (CFStringRef string = CFStringCreateWithCString(nullptr, value.get<std::string>().c_str(),
-                                                           kCFStringEncodingUTF8))
+        if (CFStringRef string =
+                CFStringCreateWithCString(nullptr, value.get<std::string>().c_str(), kCFStringEncodingUTF8))
             return string;
         throw DescriptionError(where + ": the text is not UTF-8");
     case nlohmann::json::value_t::boolean:
@@ -82,7 +82,8 @@ CFTypeRef createPropertyValue(const nlohmann::json& value, const fs::path& folde
         // An element that has no CF form ends the whole value (and releases what was made of it).
         CFOwned<CFMutableArrayRef> array(CFArrayCreateMutable(nullptr, CFIndex(value.size()), &kCFTypeArrayCallBacks));
         for (size_t i = 0; i < value.size(); ++i) {
-            const CFOwned<CFTypeRef> element(createPropertyValue(value[i], folder, where + "[" + std::to_string(i) + "]"));
+            const CFOwned<CFTypeRef> element(
+                createPropertyValue(value[i], folder, where + "[" + std::to_string(i) + "]"));
             CFArrayAppendValue(array.get(), element.get());
         }
         return array.release();
@@ -106,7 +107,8 @@ CFTypeRef createPropertyValue(const nlohmann::json& value, const fs::path& folde
             const float v = value["float"].get<float>();
             return CFNumberCreate(nullptr, kCFNumberFloat32Type, &v);
         }
-        throw DescriptionError(where + ": an object value must be one of {\"data\"}, {\"dataFile\"}, {\"int\"}, {\"float\"}");
+        throw DescriptionError(where +
+                               ": an object value must be one of {\"data\"}, {\"dataFile\"}, {\"int\"}, {\"float\"}");
     default:
         throw DescriptionError(where + ": null is not a property value");
     }
@@ -127,7 +129,8 @@ DeviceDescription parseDeviceDescription(const nlohmann::json& json, const fs::p
     d.registryID = unsignedField<uint64_t>(service, "registryID", 0, file, "service");
     if (service.contains("usages")) {
         for (const auto& usage : service["usages"]) {
-            if (!usage.is_array() || usage.size() != 2 || !usage[0].is_number_integer() || !usage[1].is_number_integer())
+            if (!usage.is_array() || usage.size() != 2 || !usage[0].is_number_integer() ||
+                !usage[1].is_number_integer())
                 fail(file, "service.usages", "each usage is [page, usage]");
             d.usages.emplace_back(usage[0].get<uint32_t>(), usage[1].get<uint32_t>());
         }

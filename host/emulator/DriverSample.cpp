@@ -41,8 +41,9 @@ IOHIDEventRef createALSEvent(const ALSSampleRecord& record, uint64_t timeStamp)
     IOHIDEventRef event = IOHIDEventCreate(kCFAllocatorDefault, kIOHIDEventTypeAmbientLightSensor, timeStamp, 0);
     IOHIDEventSetFloatValue(event, kIOHIDEventFieldAmbientLightSensorLevel, record.lux);
     IOHIDEventSetDoubleValue(event, kIOHIDEventFieldAmbientLightSensorIlluminance, record.lux);
-    const IOHIDEventField raw[4] = {kIOHIDEventFieldAmbientLightSensorRawChannel0, kIOHIDEventFieldAmbientLightSensorRawChannel1,
-                                    kIOHIDEventFieldAmbientLightSensorRawChannel2, kIOHIDEventFieldAmbientLightSensorRawChannel3};
+    const IOHIDEventField raw[4] = {
+        kIOHIDEventFieldAmbientLightSensorRawChannel0, kIOHIDEventFieldAmbientLightSensorRawChannel1,
+        kIOHIDEventFieldAmbientLightSensorRawChannel2, kIOHIDEventFieldAmbientLightSensorRawChannel3};
     for (int i = 0; i < 4; ++i)
         IOHIDEventSetFloatValue(event, raw[i], record.channelValues[size_t(i)]);
 

@@ -9,8 +9,7 @@ namespace host {
 PlugInSession::PlugInSession(const Bundle& bundle, Unit& unit) : unit_(unit), filter_(bundle.createFilter())
 {
     if (!filter_)
-        throw std::runtime_error("the bundle's factory " + bundle.factoryName() +
-                                 " gave no service-filter interface");
+        throw std::runtime_error("the bundle's factory " + bundle.factoryName() + " gave no service-filter interface");
 }
 
 PlugInSession::~PlugInSession() { (*filter_)->Release(filter_); }

@@ -18,9 +18,9 @@ struct ReportContext {
     std::string unitName;
     std::string unitSummary;
     std::string deviceFile;
-    std::string spectraOrigin;   // where the unit's channel spectra came from
-    std::string referenceSet;    // the reference file the plug-in and the baseline use
-    std::string lightsName;      // "the built-in test lights", or the files given
+    std::string spectraOrigin; // where the unit's channel spectra came from
+    std::string referenceSet;  // the reference file the plug-in and the baseline use
+    std::string lightsName;    // "the built-in test lights", or the files given
     double lux = 100.0;
 };
 

@@ -70,16 +70,16 @@ void axes(std::ostream& svg, const Frame& f)
             << "\" y2=\"" << num(f.py(v.yMax)) << "\" stroke=\"#e4e4e4\"/>";
         svg << "<line x1=\"" << num(f.px(t)) << "\" y1=\"" << num(f.py(v.yMin)) << "\" x2=\"" << num(f.px(t))
             << "\" y2=\"" << num(f.py(v.yMin) + 5) << "\" stroke=\"#444444\"/>";
-        svg << "<text x=\"" << num(f.px(t)) << "\" y=\"" << num(f.py(v.yMin) + 17)
-            << "\" text-anchor=\"middle\">" << label(t, step) << "</text>\n";
+        svg << "<text x=\"" << num(f.px(t)) << "\" y=\"" << num(f.py(v.yMin) + 17) << "\" text-anchor=\"middle\">"
+            << label(t, step) << "</text>\n";
     }
     for (double t = std::ceil(v.yMin / step - 1e-9) * step; t <= v.yMax + 1e-9; t += step) {
         svg << "<line x1=\"" << num(f.px(v.xMin)) << "\" y1=\"" << num(f.py(t)) << "\" x2=\"" << num(f.px(v.xMax))
             << "\" y2=\"" << num(f.py(t)) << "\" stroke=\"#e4e4e4\"/>";
-        svg << "<line x1=\"" << num(f.px(v.xMin) - 5) << "\" y1=\"" << num(f.py(t)) << "\" x2=\""
-            << num(f.px(v.xMin)) << "\" y2=\"" << num(f.py(t)) << "\" stroke=\"#444444\"/>";
-        svg << "<text x=\"" << num(f.px(v.xMin) - 8) << "\" y=\"" << num(f.py(t) + 4)
-            << "\" text-anchor=\"end\">" << label(t, step) << "</text>\n";
+        svg << "<line x1=\"" << num(f.px(v.xMin) - 5) << "\" y1=\"" << num(f.py(t)) << "\" x2=\"" << num(f.px(v.xMin))
+            << "\" y2=\"" << num(f.py(t)) << "\" stroke=\"#444444\"/>";
+        svg << "<text x=\"" << num(f.px(v.xMin) - 8) << "\" y=\"" << num(f.py(t) + 4) << "\" text-anchor=\"end\">"
+            << label(t, step) << "</text>\n";
     }
     svg << "<text x=\"" << num((f.px(v.xMin) + f.px(v.xMax)) / 2) << "\" y=\"" << num(f.height - 6)
         << "\" text-anchor=\"middle\" font-style=\"italic\">x</text>\n";
@@ -150,16 +150,14 @@ void lights(std::ostream& svg, const Frame& f, const std::vector<LightResult>& r
             const double x = f.px(r.baseline.xy.x), y = f.py(r.baseline.xy.y);
             svg << "<path d=\"M" << num(x - 3) << "," << num(y - 3) << " L" << num(x + 3) << "," << num(y + 3) << " M"
                 << num(x - 3) << "," << num(y + 3) << " L" << num(x + 3) << "," << num(y - 3) << "\" stroke=\""
-                << kBaselineColour << "\" stroke-width=\"1.6\"><title>" << name
-                << ": global matrix</title></path>\n";
+                << kBaselineColour << "\" stroke-width=\"1.6\"><title>" << name << ": global matrix</title></path>\n";
         }
         if (r.plugIn.valid) {
             svg << "<line x1=\"" << num(f.px(r.trueXy.x)) << "\" y1=\"" << num(f.py(r.trueXy.y)) << "\" x2=\""
-                << num(f.px(r.plugIn.xy.x)) << "\" y2=\"" << num(f.py(r.plugIn.xy.y)) << "\" stroke=\""
-                << kPlugInColour << "\" stroke-width=\"1.4\"/>";
+                << num(f.px(r.plugIn.xy.x)) << "\" y2=\"" << num(f.py(r.plugIn.xy.y)) << "\" stroke=\"" << kPlugInColour
+                << "\" stroke-width=\"1.4\"/>";
             svg << "<circle cx=\"" << num(f.px(r.plugIn.xy.x)) << "\" cy=\"" << num(f.py(r.plugIn.xy.y))
-                << "\" r=\"2.6\" fill=\"" << kPlugInColour << "\"><title>" << name
-                << ": plug-in</title></circle>\n";
+                << "\" r=\"2.6\" fill=\"" << kPlugInColour << "\"><title>" << name << ": plug-in</title></circle>\n";
         }
         svg << "<circle cx=\"" << num(f.px(r.trueXy.x)) << "\" cy=\"" << num(f.py(r.trueXy.y))
             << "\" r=\"3.6\" fill=\"none\" stroke=\"" << kTrueColour << "\" stroke-width=\"1.2\"><title>" << name

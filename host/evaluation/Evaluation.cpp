@@ -53,8 +53,8 @@ ErrorSummary summarise(const std::vector<LightResult>& results, Estimate LightRe
     return s;
 }
 
-std::vector<LightResult> evaluateLights(const std::vector<spectra::Source>& lights, const UnitSpectra& unit,
-                                        double lux, const Estimator& plugIn, const Estimator& baseline,
+std::vector<LightResult> evaluateLights(const std::vector<spectra::Source>& lights, const UnitSpectra& unit, double lux,
+                                        const Estimator& plugIn, const Estimator& baseline,
                                         const std::function<void(size_t)>& progress)
 {
     std::vector<LightResult> results;

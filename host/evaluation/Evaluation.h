@@ -21,8 +21,8 @@ struct Estimate {
     bool valid = false; // the estimator gave a colour
     spectra::Xy xy;
     std::optional<double> cct;
-    double deltaUv = 0.0;             // Δu′v′ from the true chromaticity
-    std::optional<double> deltaCct;   // estimated − true CCT, where both exist
+    double deltaUv = 0.0;           // Δu′v′ from the true chromaticity
+    std::optional<double> deltaCct; // estimated − true CCT, where both exist
 };
 
 struct LightResult {
@@ -50,8 +50,8 @@ ErrorSummary summarise(const std::vector<LightResult>& results, Estimate LightRe
 
 // Evaluates every light: one noise-free reading at `lux`, both estimators on
 // it. `progress` (may be empty) is called after each light with the number done.
-std::vector<LightResult> evaluateLights(const std::vector<spectra::Source>& lights, const UnitSpectra& unit,
-                                        double lux, const Estimator& plugIn, const Estimator& baseline,
+std::vector<LightResult> evaluateLights(const std::vector<spectra::Source>& lights, const UnitSpectra& unit, double lux,
+                                        const Estimator& plugIn, const Estimator& baseline,
                                         const std::function<void(size_t)>& progress = {});
 
 } // namespace host

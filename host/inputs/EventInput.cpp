@@ -195,8 +195,9 @@ std::optional<InputRow> EventReader::parseCsvLine(const std::string& text, std::
         return std::nullopt;
     }
     if (cells.size() != header_.size()) {
-        errors.push_back({line_, "", "has " + std::to_string(cells.size()) + " values for " +
-                                         std::to_string(header_.size()) + " header fields"});
+        errors.push_back({line_, "",
+                          "has " + std::to_string(cells.size()) + " values for " + std::to_string(header_.size()) +
+                              " header fields"});
         return std::nullopt;
     }
     std::vector<std::pair<std::string, double>> fields;
@@ -270,8 +271,9 @@ std::optional<InputRow> EventReader::buildSample(const std::vector<std::pair<std
         if (name == "ts") {
             // The event's time stamp counts nanoseconds in 64 bits.
             if (!(value >= 0.0 && value < kLatestTimeSeconds)) {
-                errors.push_back({line_, name, "value " + std::to_string(value) + " is not a time from 0 to " +
-                                                   std::to_string(kLatestTimeSeconds) + " seconds"});
+                errors.push_back({line_, name,
+                                  "value " + std::to_string(value) + " is not a time from 0 to " +
+                                      std::to_string(kLatestTimeSeconds) + " seconds"});
                 return std::nullopt;
             }
             row.timeSeconds = value;

@@ -92,8 +92,8 @@ Table readCsv(const fs::path& file)
         if (!value)
             failAt(file, line, "'" + row[1] + "' is not a number");
         if (!table.nm.empty() && *nm <= table.nm.back())
-            failAt(file, line, "wavelengths must ascend (" + row[0] + " nm after " + std::to_string(table.nm.back()) +
-                                   " nm)");
+            failAt(file, line,
+                   "wavelengths must ascend (" + row[0] + " nm after " + std::to_string(table.nm.back()) + " nm)");
         table.nm.push_back(*nm);
         table.values.push_back(*value);
     }

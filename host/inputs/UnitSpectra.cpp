@@ -228,11 +228,13 @@ UnitSpectra fromFactoryStore(const DeviceDescription& unit)
             fail(unit, what + ": a " + std::string(recordcodec::kindName(*kind)) +
                            " record is not a factory calibration the plug-in reads");
         }
-        out.origin = "factory store class " + cls + " (" + what + ", " + std::string(recordcodec::kindName(*kind)) + ")";
+        out.origin =
+            "factory store class " + cls + " (" + what + ", " + std::string(recordcodec::kindName(*kind)) + ")";
         return out;
     }
-    fail(unit, "the factory store " + unit.factoryStore->string() + " holds no record of class " + classes[0] +
-                   " or " + classes[1] + ", so the unit runs on the built-in default calibration and has no "
+    fail(unit, "the factory store " + unit.factoryStore->string() + " holds no record of class " + classes[0] + " or " +
+                   classes[1] +
+                   ", so the unit runs on the built-in default calibration and has no "
                    "stored channel spectra");
 }
 

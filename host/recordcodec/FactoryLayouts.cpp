@@ -47,13 +47,12 @@ void vd6287Header(const Describer& d)
     h.scalar("numBlobs", numBlobs, T::U8);
 }
 
-void vd6287Channels(const Describer& b, size_t ratio, size_t byte, size_t byteStride, FieldType byteType,
-                    size_t factor, size_t lux, size_t cct, size_t value)
+void vd6287Channels(const Describer& b, size_t ratio, size_t byte, size_t byteStride, FieldType byteType, size_t factor,
+                    size_t lux, size_t cct, size_t value)
 {
     for (unsigned j = 0; j < stored::vd6287::kChannels; ++j) {
         const Describer ch = b.element("channels", j, 0, b.windowLength());
-        ch.array("gainRatio", ratio + stored::vd6287::blob::gainRatioStride * j, T::U16, stored::vd6287::kGains,
-                 kQ14);
+        ch.array("gainRatio", ratio + stored::vd6287::blob::gainRatioStride * j, T::U16, stored::vd6287::kGains, kQ14);
         ch.scalar("channelByte", byte + byteStride * j, byteType);
         ch.scalar("channelFactor", factor + 2 * j, T::I16, kQ14);
         ch.scalar("luxCoeff", lux + 4 * j, T::I32, kQ16);

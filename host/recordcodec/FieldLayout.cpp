@@ -2,8 +2,8 @@
 
 #include "support/LittleEndian.h"
 
-#include <cmath>
 #include <algorithm>
+#include <cmath>
 #include <cstdio>
 #include <cstring>
 #include <limits>
@@ -285,7 +285,8 @@ uint16_t Describer::u16(size_t offset) const
 void Describer::add(const std::string& name, size_t offset, FieldType type, size_t count, bool scalar,
                     double divisor) const
 {
-    Field f{.path = path_, .offset = base_ + offset, .type = type, .count = count, .scalar = scalar, .divisor = divisor};
+    Field f{
+        .path = path_, .offset = base_ + offset, .type = type, .count = count, .scalar = scalar, .divisor = divisor};
     f.path.emplace_back(name);
     if (count == 0 || !inWindow(offset, f.byteLength()))
         return;

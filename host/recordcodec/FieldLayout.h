@@ -28,9 +28,9 @@ struct Field {
     std::vector<PathStep> path;
     size_t offset = 0;
     FieldType type = FieldType::U8;
-    size_t count = 1;    // elements (characters for Text)
-    bool scalar = true;  // one value rather than an array
-    double divisor = 0;  // fixed point: shown raw and as raw / divisor; 0 = plain
+    size_t count = 1;   // elements (characters for Text)
+    bool scalar = true; // one value rather than an array
+    double divisor = 0; // fixed point: shown raw and as raw / divisor; 0 = plain
     size_t byteLength() const { return fieldTypeSize(type) * count; }
     bool operator==(const Field&) const = default;
 };

@@ -195,8 +195,8 @@ Result<Json> decode(std::span<const uint8_t> bytes, std::optional<Kind> kind)
                                   " bytes long; name the format of a registry blob"};
     const KindInfo& info = infoOf(*kind);
     if (!sizeAllowed(info, bytes.size()))
-        return {std::nullopt, std::string(info.name) + " records are not " + std::to_string(bytes.size()) +
-                                  " bytes long"};
+        return {std::nullopt,
+                std::string(info.name) + " records are not " + std::to_string(bytes.size()) + " bytes long"};
 
     const std::vector<Field> fields = describe(*kind, bytes);
     Json values = Json::object();

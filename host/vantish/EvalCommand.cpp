@@ -50,8 +50,7 @@ void printEstimate(const host::Estimate& e)
 void printTable(const std::vector<host::LightResult>& results)
 {
     std::printf("%-38s  %-20s  %-34s  %s\n", "", "true", "plug-in", "global matrix");
-    std::printf("%-38s  x      y        CCT  x      y      Δu′v′     ΔCCT  x      y      Δu′v′     ΔCCT\n",
-                "light");
+    std::printf("%-38s  x      y        CCT  x      y      Δu′v′     ΔCCT  x      y      Δu′v′     ΔCCT\n", "light");
     for (const host::LightResult& r : results) {
         std::printf("%-38s  %.4f %.4f %6s", r.name.c_str(), r.trueXy.x, r.trueXy.y, cctText(r.trueCct).c_str());
         printEstimate(r.plugIn);

@@ -13,7 +13,7 @@ struct EvalOptions {
     std::vector<std::string> spectra; // files or folders; empty: the built-in test lights
     std::string report;               // the HTML report to write; empty: none
     double lux = 100.0;
-    std::vector<std::string> sets;    // client properties set before the first reading
+    std::vector<std::string> sets; // client properties set before the first reading
 };
 
 // Prints the table and the summary, writes the report. 0 when the lights were

@@ -95,8 +95,9 @@ Runner addLightdbCommand(CLI::App& app, const CommonOptions&)
     auto o = std::make_shared<LightdbOptions>();
     app.require_subcommand(1);
     CLI::App* info = app.add_subcommand("info", "Show a light database file: Info, source count, grid, families");
-    info->add_option("file", o->file, "A reference database (bzlight.sqlite, bzlight-02.sqlite) or a per-chip cache "
-                                      "(bzrgbc_<orientation>.sqlite)")
+    info->add_option("file", o->file,
+                     "A reference database (bzlight.sqlite, bzlight-02.sqlite) or a per-chip cache "
+                     "(bzrgbc_<orientation>.sqlite)")
         ->required();
     info->footer("Families are the name prefixes of the sources (led, ledr, daylight, …) from the file's Names\n"
                  "table; the reference databases built by make_reference_db carry one.");

@@ -3,8 +3,8 @@
 #include "host/vantish/Commands.h"
 
 #include "host/emulator/Bundle.h"
-#include "host/emulator/DriverSample.h"
 #include "host/emulator/DataFolder.h"
+#include "host/emulator/DriverSample.h"
 #include "host/emulator/PlugInSession.h"
 #include "host/emulator/Unit.h"
 #include "support/CFOwned.h"
@@ -111,8 +111,9 @@ int runOpen(const CommonOptions& common, const OpenOptions& options)
         session.filter(event.get());
         const bool colour = IOHIDEventGetIntegerValue(event.get(), kIOHIDEventFieldAmbientLightColorSpace) != 0;
         VPLogTakeCaptured();
-        std::cout << "colour  " << (colour ? "on: the per-chip database is ready (dbReady)"
-                                           : "off: no per-chip database (dbReady is 0)")
+        std::cout << "colour  "
+                  << (colour ? "on: the per-chip database is ready (dbReady)"
+                             : "off: no per-chip database (dbReady is 0)")
                   << "\n";
         VPLogStopCapture();
         return 0;

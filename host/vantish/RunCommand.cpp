@@ -44,7 +44,7 @@ public:
         std::ostringstream line;
         line << std::setprecision(6);
         if (json_) {
-            nlohmann::json j = {{"index", r.index}, {"lux", r.lux}, {"X", r.X}, {"Y", r.Y}, {"Z", r.Z},
+            nlohmann::json j = {{"index", r.index},           {"lux", r.lux},    {"X", r.X}, {"Y", r.Y}, {"Z", r.Z},
                                 {"colorSpace", r.colorSpace}, {"spike", r.spike}};
             if (hasColour) {
                 j["x"] = xy.x;

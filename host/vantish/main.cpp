@@ -22,7 +22,8 @@ int main(int argc, char** argv)
     common.state = host::defaultStateFolder();
     app.add_option("--bundle", common.bundle, "Plug-in bundle folder (holding Info.json)")->capture_default_str();
     app.add_option("--state", common.state, "State folder for the per-chip database caches")->capture_default_str();
-    app.add_option("--log", common.logLevel, "Also print the plug-in's log at this level: off, error, default, info, debug")
+    app.add_option("--log", common.logLevel,
+                   "Also print the plug-in's log at this level: off, error, default, info, debug")
         ->check(CLI::IsMember({"off", "error", "default", "info", "debug"}));
     app.require_subcommand(0, 1);
     app.set_help_all_flag("--help-all", "Print the help of every command and exit");

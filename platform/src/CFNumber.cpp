@@ -64,12 +64,24 @@ struct __CFNumber final : vp::CFObject {
     __CFNumber(CFNumberType type, Kind kind, const void* valuePtr) : CFObject(vp::kNumberTypeID), type(type), kind(kind)
     {
         switch (kind) {
-        case Kind::Int8: integer = load<int8_t>(valuePtr); break;
-        case Kind::Int16: integer = load<int16_t>(valuePtr); break;
-        case Kind::Int32: integer = load<int32_t>(valuePtr); break;
-        case Kind::Int64: integer = load<int64_t>(valuePtr); break;
-        case Kind::Float32: real = load<float>(valuePtr); break;
-        case Kind::Float64: real = load<double>(valuePtr); break;
+        case Kind::Int8:
+            integer = load<int8_t>(valuePtr);
+            break;
+        case Kind::Int16:
+            integer = load<int16_t>(valuePtr);
+            break;
+        case Kind::Int32:
+            integer = load<int32_t>(valuePtr);
+            break;
+        case Kind::Int64:
+            integer = load<int64_t>(valuePtr);
+            break;
+        case Kind::Float32:
+            real = load<float>(valuePtr);
+            break;
+        case Kind::Float64:
+            real = load<double>(valuePtr);
+            break;
         }
     }
 
@@ -194,12 +206,18 @@ Boolean CFNumberGetValue(CFNumberRef number, CFNumberType type, void* valuePtr)
     if (!kind || !valuePtr)
         return false;
     switch (*kind) {
-    case Kind::Int8: return toInteger<int8_t>(n, valuePtr);
-    case Kind::Int16: return toInteger<int16_t>(n, valuePtr);
-    case Kind::Int32: return toInteger<int32_t>(n, valuePtr);
-    case Kind::Int64: return toInteger<int64_t>(n, valuePtr);
-    case Kind::Float32: return toFloat32(n, valuePtr);
-    case Kind::Float64: return toFloat64(n, valuePtr);
+    case Kind::Int8:
+        return toInteger<int8_t>(n, valuePtr);
+    case Kind::Int16:
+        return toInteger<int16_t>(n, valuePtr);
+    case Kind::Int32:
+        return toInteger<int32_t>(n, valuePtr);
+    case Kind::Int64:
+        return toInteger<int64_t>(n, valuePtr);
+    case Kind::Float32:
+        return toFloat32(n, valuePtr);
+    case Kind::Float64:
+        return toFloat64(n, valuePtr);
     }
     return false;
 }

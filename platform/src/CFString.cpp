@@ -10,10 +10,7 @@
 struct __CFString final : vp::CFObject {
     __CFString(std::string_view text, vp::Lifetime lifetime) : CFObject(vp::kStringTypeID, lifetime), text(text) {}
 
-    bool equals(const CFObject& other) const override
-    {
-        return text == static_cast<const __CFString&>(other).text;
-    }
+    bool equals(const CFObject& other) const override { return text == static_cast<const __CFString&>(other).text; }
     std::string describe() const override { return text; }
 
     const std::string text;

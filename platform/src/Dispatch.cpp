@@ -13,6 +13,7 @@
 // and blocks queued from then on, never run and are never destroyed (their
 // captures may point at objects that are already gone).
 #include <dispatch/dispatch.h>
+
 #include <VantishPlatform/DispatchControl.h>
 
 #include <algorithm>

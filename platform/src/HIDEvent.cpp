@@ -16,7 +16,8 @@ constexpr size_t kFieldCapacity = 16;
 } // namespace
 
 struct __IOHIDEvent final : vp::CFObject {
-    __IOHIDEvent(IOHIDEventType type, uint64_t timeStamp) : CFObject(vp::kHIDEventTypeID), type(type), timeStamp(timeStamp)
+    __IOHIDEvent(IOHIDEventType type, uint64_t timeStamp)
+        : CFObject(vp::kHIDEventTypeID), type(type), timeStamp(timeStamp)
     {
         fields.reserve(kFieldCapacity);
     }
@@ -152,9 +153,8 @@ IOHIDEventRef IOHIDEventCreate(CFAllocatorRef, IOHIDEventType type, uint64_t tim
     return new __IOHIDEvent(type, timeStamp);
 }
 
-IOHIDEventRef IOHIDEventCreateVendorDefinedEvent(CFAllocatorRef, uint64_t timeStamp, uint32_t usagePage,
-                                                 uint32_t usage, uint32_t version, const uint8_t* data,
-                                                 CFIndex length, IOOptionBits)
+IOHIDEventRef IOHIDEventCreateVendorDefinedEvent(CFAllocatorRef, uint64_t timeStamp, uint32_t usagePage, uint32_t usage,
+                                                 uint32_t version, const uint8_t* data, CFIndex length, IOOptionBits)
 {
     if (length < 0 || (!data && length > 0))
         return nullptr;

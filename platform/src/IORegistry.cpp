@@ -175,8 +175,8 @@ io_service_t IOServiceGetMatchingService(mach_port_t, CFDictionaryRef matching)
 
 // Only a search that is both recursive and towards the parents leaves the
 // entry; any other option set reads the entry's own property.
-CFTypeRef IORegistryEntrySearchCFProperty(io_registry_entry_t entry, const char* plane, CFStringRef key,
-                                          CFAllocatorRef, IOOptionBits options)
+CFTypeRef IORegistryEntrySearchCFProperty(io_registry_entry_t entry, const char* plane, CFStringRef key, CFAllocatorRef,
+                                          IOOptionBits options)
 {
     if (!isServicePlane(plane))
         return nullptr;

@@ -4,6 +4,7 @@
 // Handles and the logging state are never freed, so that blocks still running
 // while the process exits can log.
 #include <os/log.h>
+
 #include <VantishPlatform/LogControl.h>
 
 #include "LogFormat.h"
@@ -160,10 +161,7 @@ os_log_t os_log_create(const char* subsystem, const char* category)
     return state().create(subsystem, category);
 }
 
-bool os_log_type_enabled(os_log_t log, os_log_type_t type)
-{
-    return levelNeeded(type) <= state().level.load();
-}
+bool os_log_type_enabled(os_log_t log, os_log_type_t type) { return levelNeeded(type) <= state().level.load(); }
 
 void _os_log_emit(os_log_t log, os_log_type_t type, const char* format, ...)
 {

@@ -1,6 +1,7 @@
 // Host time base: nanoseconds of the monotonic clock, one tick = numer/denom ns
 // as reported (1/1 unless a test sets another time base).
 #include <mach/mach_time.h>
+
 #include <VantishPlatform/DeviceState.h>
 
 #include <atomic>

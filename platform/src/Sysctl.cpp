@@ -1,6 +1,7 @@
 // sysctlbyname for the one name the plug-in reads, "kern.bootargs": the boot
 // arguments set by the host, else this machine's kernel command line.
 #include <sys/sysctl.h>
+
 #include <VantishPlatform/DeviceState.h>
 
 #include <atomic>

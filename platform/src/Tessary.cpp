@@ -1,5 +1,6 @@
 // Device-information answers, set by the host, keyed by the question's text.
 #include <Tessary/Tessary.h>
+
 #include <VantishPlatform/DeviceState.h>
 
 #include "PlatformText.h"

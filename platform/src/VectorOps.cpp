@@ -46,8 +46,7 @@ void vDSP_maxv(const float* A, vDSP_Stride IA, float* C, vDSP_Length N)
     *C = largest;
 }
 
-void vDSP_vmul(const float* A, vDSP_Stride IA, const float* B, vDSP_Stride IB, float* C, vDSP_Stride IC,
-               vDSP_Length N)
+void vDSP_vmul(const float* A, vDSP_Stride IA, const float* B, vDSP_Stride IB, float* C, vDSP_Stride IC, vDSP_Length N)
 {
     for (vDSP_Length n = 0; n < N; ++n)
         C[ptrdiff_t(n) * IC] = A[ptrdiff_t(n) * IA] * B[ptrdiff_t(n) * IB];

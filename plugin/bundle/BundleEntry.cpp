@@ -2,5 +2,5 @@
 // only keeps the factory referenced so the linker exports it.
 #include "plugin/VantishPlugIn.h"
 
-extern "C" __attribute__((visibility("default"), used)) void* (*const vantishBundleFactory)(CFAllocatorRef, CFUUIDRef) =
-    &VantishPlugInFactory;
+extern "C" __attribute__((visibility("default"),
+                          used)) void* (*const vantishBundleFactory)(CFAllocatorRef, CFUUIDRef) = &VantishPlugInFactory;

@@ -109,8 +109,8 @@ void writeReference(const std::filesystem::path& file, int sources)
     exec(db, "CREATE TABLE Spectra (" + columns + ")");
     exec(db, "BEGIN");
     for (int i = 0; i < sources; ++i) {
-        std::string row = std::to_string(i) + ", " + std::to_string(10 + i) + ", " + std::to_string(20 + 2 * i) +
-                          ", " + std::to_string(30 - i);
+        std::string row = std::to_string(i) + ", " + std::to_string(10 + i) + ", " + std::to_string(20 + 2 * i) + ", " +
+                          std::to_string(30 - i);
         // Smooth spectra that differ in slope from source to source.
         for (int s = 0; s < 401; ++s)
             row += ", " + std::to_string(1.0 + 0.01 * s * (i % 3) + 0.005 * (400 - s) * ((i + 1) % 2));

@@ -169,7 +169,10 @@ inline int32_t lux(unsigned k, unsigned j) { return int32_t(65536 * (j + 2) + k)
 inline int32_t cct(unsigned k, unsigned j) { return -int32_t(256 * (j + 1) + k); }
 inline uint32_t sharedValue(unsigned k) { return 0x00018000u + k; }
 inline uint32_t channelValue(unsigned k, unsigned j) { return 0x00020000u + j * 0x100 + k; }
-inline int16_t sample(unsigned k, unsigned c, unsigned s) { return int16_t(int((s * 5 + c * 13 + k * 100) % 300) - 50); }
+inline int16_t sample(unsigned k, unsigned c, unsigned s)
+{
+    return int16_t(int((s * 5 + c * 13 + k * 100) % 300) - 50);
+}
 inline uint16_t table(unsigned k, char name, unsigned m) { return uint16_t(0x100 * (name - 'A' + 1) + 0x10 * k + m); }
 } // namespace vd
 // Gain ratios: 16384 (1.0) everywhere unless `unitRatios` is false.
@@ -220,8 +223,8 @@ protected:
         CFRelease(k);
         if (!value)
             return {};
-        std::vector<uint8_t> out = CFGetTypeID(value) == CFDataGetTypeID() ? bytesOf(CFDataRef(value))
-                                                                            : std::vector<uint8_t>{};
+        std::vector<uint8_t> out =
+            CFGetTypeID(value) == CFDataGetTypeID() ? bytesOf(CFDataRef(value)) : std::vector<uint8_t>{};
         CFRelease(value);
         return out;
     }

@@ -14,7 +14,8 @@ protected:
     size_t countStartingWith(const std::string& prefix)
     {
         const auto all = log.messages();
-        return size_t(std::count_if(all.begin(), all.end(), [&](const std::string& m) { return m.starts_with(prefix); }));
+        return size_t(
+            std::count_if(all.begin(), all.end(), [&](const std::string& m) { return m.starts_with(prefix); }));
     }
 };
 

@@ -77,7 +77,8 @@ TEST_F(SpectrumExtractionTest, XwClColumnsBeyondTheEntryAreRejected)
     EXPECT_FALSE(calib::extractXwClSpectrum(parts(*plugin).calibration(), record.vec(), 76, seven));
     Matrices past = matrices(5);
     parts(*plugin).unit().numberOfChannels = 5;
-    EXPECT_FALSE(calib::extractXwClSpectrum(parts(*plugin).calibration(), record.vec(), 76 + 5080, past)); // one entry only
+    EXPECT_FALSE(
+        calib::extractXwClSpectrum(parts(*plugin).calibration(), record.vec(), 76 + 5080, past)); // one entry only
     EXPECT_TRUE(past.channelWeights.empty());
 }
 

@@ -72,8 +72,9 @@ TEST_F(XwCAT2FormatTest, TimingFollowsVersionAndModel)
     EXPECT_EQ(parts(*plugin).unit().numberOfChannels.load(), 5u);
     EXPECT_EQ(parts(*plugin).unit().dbChannelCount.load(), 5u);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "processQVTCalibrationXwCAT2: gain = 16, iTime = 180"));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "processQVTCalibrationXwCAT2: luxCoeff[0]=0.007812, "
-                                                  "cctCoeff[0]=-3.000000, offsetCounts[0]=-50/255 darkCounts[0] = -112"));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT,
+                             "processQVTCalibrationXwCAT2: luxCoeff[0]=0.007812, "
+                             "cctCoeff[0]=-3.000000, offsetCounts[0]=-50/255 darkCounts[0] = -112"));
 }
 
 TEST_F(XwCAT2FormatTest, ChipIdIsReadAsHexadecimalText)

@@ -85,8 +85,13 @@ TEST_F(XwClFormatTest, FiveChannelRecordComesFromTheFirstEntry)
 {
     for (uint8_t device : {uint8_t(14), uint8_t(19)}) {
         SCOPED_TRACE(int(device));
-        const XwClShape shape{.entries = 2, .deviceID = device, .chipID = 0x11223344, .chipType = 1, .selector = 2,
-                            .nChannels = 4, .nGains = 7};
+        const XwClShape shape{.entries = 2,
+                              .deviceID = device,
+                              .chipID = 0x11223344,
+                              .chipType = 1,
+                              .selector = 2,
+                              .nChannels = 4,
+                              .nGains = 7};
         parts(*plugin).unit().chipId = 0x11223344;
         ASSERT_TRUE(load(shape));
         EXPECT_BYTES_EQ(received("ALSCalibrationData"), fiveChannelRecord(shape, 0).vec());
@@ -99,16 +104,17 @@ TEST_F(XwClFormatTest, FiveChannelRecordComesFromTheFirstEntry)
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "Found Marlit calibration"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "XwCl version = v2.3\n"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Found calibration for chip with ID = 0x11223344\n"));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG,
-                             "loadQVTCalibration: luxCoeff[1]=2.000046, cctCoeff[1]=-7.812500, offsetCounts[1]=-301/255"));
+    EXPECT_TRUE(
+        log.contains(OS_LOG_TYPE_DEBUG,
+                     "loadQVTCalibration: luxCoeff[1]=2.000046, cctCoeff[1]=-7.812500, offsetCounts[1]=-301/255"));
 }
 
 TEST_F(XwClFormatTest, FourChannelRecordComesFromTheSelectedEntry)
 {
     for (uint8_t device : {uint8_t(35), uint8_t(58)}) {
         SCOPED_TRACE(int(device));
-        const XwClShape shape{.entries = 2, .deviceID = device, .chipType = 2, .selector = 2, .nChannels = 4,
-                            .nGains = 8};
+        const XwClShape shape{
+            .entries = 2, .deviceID = device, .chipType = 2, .selector = 2, .nChannels = 4, .nGains = 8};
         parts(*plugin).unit().chipType = 7;
         ASSERT_TRUE(load(shape));
         EXPECT_BYTES_EQ(received("ALSCalibrationData"), fourChannelRecord(shape, 1).vec());
@@ -126,8 +132,8 @@ TEST_F(XwClFormatTest, SixChannelRecordScalesColourTemperatureByChipType)
 {
     for (uint8_t chipType : {uint8_t(0), uint8_t(1)}) {
         SCOPED_TRACE(int(chipType));
-        const XwClShape shape{.entries = 1, .deviceID = 62, .chipType = chipType, .selector = 1, .nChannels = 6,
-                            .nGains = 9};
+        const XwClShape shape{
+            .entries = 1, .deviceID = 62, .chipType = chipType, .selector = 1, .nChannels = 6, .nGains = 9};
         ASSERT_TRUE(load(shape));
         EXPECT_BYTES_EQ(received("ALSCalibrationData"), sixChannelRecord(shape, 0).vec());
         EXPECT_FLOAT_EQ(parts(*plugin).unit().smallDBVersion.load(), 1.2f);
@@ -165,13 +171,13 @@ TEST_F(XwClFormatTest, ChipIdMustMatch)
 TEST_F(XwClFormatTest, RecordsThatDoNotFitTheirLayoutAreRejected)
 {
     const XwClShape rejected[] = {
-        {.entries = 1, .deviceID = 62, .selector = 0, .nChannels = 6},  // selector names no entry
-        {.entries = 2, .deviceID = 35, .selector = 3, .nChannels = 4},  // past the second entry
-        {.entries = 1, .deviceID = 58, .selector = 2, .nChannels = 4},  // one entry only
-        {.entries = 1, .deviceID = 35, .selector = 1, .nChannels = 5},  // 4-channel record
-        {.entries = 1, .deviceID = 14, .selector = 1, .nChannels = 6},  // 5-channel record
-        {.entries = 1, .deviceID = 62, .selector = 1, .nChannels = 7},  // 6-channel record
-        {.entries = 1, .deviceID = 62, .selector = 1, .nChannels = 1},  // no channel left for colour
+        {.entries = 1, .deviceID = 62, .selector = 0, .nChannels = 6}, // selector names no entry
+        {.entries = 2, .deviceID = 35, .selector = 3, .nChannels = 4}, // past the second entry
+        {.entries = 1, .deviceID = 58, .selector = 2, .nChannels = 4}, // one entry only
+        {.entries = 1, .deviceID = 35, .selector = 1, .nChannels = 5}, // 4-channel record
+        {.entries = 1, .deviceID = 14, .selector = 1, .nChannels = 6}, // 5-channel record
+        {.entries = 1, .deviceID = 62, .selector = 1, .nChannels = 7}, // 6-channel record
+        {.entries = 1, .deviceID = 62, .selector = 1, .nChannels = 1}, // no channel left for colour
         {.entries = 1, .deviceID = 19, .selector = 1, .nChannels = 0},
         {.entries = 1, .deviceID = 14, .selector = 1, .nChannels = 5, .nGains = 10},
         {.entries = 1, .deviceID = 20, .selector = 1, .nChannels = 5}, // unknown device
@@ -192,8 +198,8 @@ TEST_F(XwClFormatTest, RecordsThatDoNotFitTheirLayoutAreRejected)
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR, "XwCl calibration with 5 channels and 10 gains does not fit the "
                                                 "5-channel record -> calibration will be skipped.\n"));
     load({.entries = 2, .deviceID = 35, .selector = 3, .nChannels = 4});
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR,
-                             "XwCl entry selector 3 names no entry of 2 -> calibration will be skipped.\n"));
+    EXPECT_TRUE(
+        log.contains(OS_LOG_TYPE_ERROR, "XwCl entry selector 3 names no entry of 2 -> calibration will be skipped.\n"));
 }
 
 } // namespace

@@ -272,9 +272,9 @@ static void expectStopped(FitSettings& fit, const SpectralDatabase& db, std::vec
     EXPECT_EQ(xyz, (XYZ{0.0f, 0.0f, 3.0f}));
     std::vector<std::string> lines = log.messages();
     ASSERT_EQ(lines.size(), lineCount);
-    EXPECT_EQ(std::vector<std::string>(lines.end() - 2, lines.end()),
-              (std::vector<std::string>{reason,
-                                        "Color: X=0.000000(0.000000) Y=0.000000(0.000000) Z=3.000000(0.954930) \n"}));
+    EXPECT_EQ(
+        std::vector<std::string>(lines.end() - 2, lines.end()),
+        (std::vector<std::string>{reason, "Color: X=0.000000(0.000000) Y=0.000000(0.000000) Z=3.000000(0.954930) \n"}));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, reason));
 }
 
@@ -377,8 +377,8 @@ TEST(StandardDeviation, PopulationFormPerRow)
     calculateSTD(rows, out, 4, 2);
     EXPECT_FLOAT_EQ(out[0], std::sqrt(1.25f));
     EXPECT_EQ(out[1], 0.0f);
-    EXPECT_EQ(log.messages(), (std::vector<std::string>{"Standard deviation[0]: 1.118034\n",
-                                                        "Standard deviation[1]: 0.000000\n"}));
+    EXPECT_EQ(log.messages(),
+              (std::vector<std::string>{"Standard deviation[0]: 1.118034\n", "Standard deviation[1]: 0.000000\n"}));
 
     float untouched[1] = {-1.0f};
     calculateSTD(rows, untouched, 0, 1);
@@ -431,8 +431,8 @@ TEST(SimdLevels, EveryLevelGivesTheBaselineBits)
         SpectralDatabase raw = makeDatabase(N, 5, 40u + unsigned(N));
         SpectralDatabase normalised = raw;
         normaliseDatabase(normalised);
-        for (const Mode& mode : {Mode{false, 0.0f, 2.0f}, Mode{true, 0.01f, 2.0f}, Mode{false, 0.01f, 2.0f},
-                                 Mode{false, 0.0f, 1.7f}}) {
+        for (const Mode& mode :
+             {Mode{false, 0.0f, 2.0f}, Mode{true, 0.01f, 2.0f}, Mode{false, 0.01f, 2.0f}, Mode{false, 0.0f, 1.7f}}) {
             const FitSettings fit{mode.exponent, 0.00001f, mode.lambda, mode.normalised};
             const SpectralDatabase& db = mode.normalised ? normalised : raw;
             std::vector<XYZ> results;

@@ -111,12 +111,12 @@ TEST(HeavySamples, TheLinearPathAgreesWithTheClosedForm)
     Problem blind = randomProblem(150, 4, 24u, Weights::OneHeavy);
     for (int i = 0; i < blind.N; ++i)
         blind.R[size_t(2) * blind.N + i] = 0.0f;
-    for (const Case& c : {Case{"one heavy", one, 0.5f}, Case{"all heavy", all, 2000.0f},
-                          Case{"wide weights", wideWeights(400, 5, 25u), 0.01f},
-                          Case{"wide weights, strong ridge", wideWeights(400, 4, 26u), 1e4f},
-                          Case{"rank-deficient light block", deficient, 0.01f},
-                          Case{"twelve channels", wideWeights(300, 12, 27u), 0.5f},
-                          Case{"a channel nobody sees", blind, 0.01f}}) {
+    for (const Case& c :
+         {Case{"one heavy", one, 0.5f}, Case{"all heavy", all, 2000.0f},
+          Case{"wide weights", wideWeights(400, 5, 25u), 0.01f},
+          Case{"wide weights, strong ridge", wideWeights(400, 4, 26u), 1e4f},
+          Case{"rank-deficient light block", deficient, 0.01f},
+          Case{"twelve channels", wideWeights(300, 12, 27u), 0.5f}, Case{"a channel nobody sees", blind, 0.01f}}) {
         EXPECT_LT(relativeError(coefficients(run(hybridSolveWithRegularization, c.p, c.lambda), c.p.M),
                                 closedForm(c.p, c.lambda)),
                   kTolerance)

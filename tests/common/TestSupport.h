@@ -57,7 +57,7 @@ private:
     VPLogLevel previous_;
 };
 
-std::string bundleDir();   // the built Vantish.plugin folder
-std::string sourceDir();   // the project's source tree
+std::string bundleDir(); // the built Vantish.plugin folder
+std::string sourceDir(); // the project's source tree
 
 } // namespace vt

@@ -3,9 +3,9 @@
 // writes from outside the plug-in.
 #pragma once
 
-#include "stress/SyntheticUnit.h"
 #include "common/PlugInHolder.h"
 #include "common/TestSupport.h"
+#include "stress/SyntheticUnit.h"
 
 #include <gtest/gtest.h>
 #include <sqlite3.h>

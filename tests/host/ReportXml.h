@@ -23,7 +23,7 @@ public:
     int count(const std::string& xpath) const
     {
         std::unique_ptr<xmlXPathContext, decltype(&xmlXPathFreeContext)> context(xmlXPathNewContext(doc_.get()),
-                                                                                  xmlXPathFreeContext);
+                                                                                 xmlXPathFreeContext);
         xmlXPathRegisterNs(context.get(), BAD_CAST "h", BAD_CAST "http://www.w3.org/1999/xhtml");
         xmlXPathRegisterNs(context.get(), BAD_CAST "svg", BAD_CAST "http://www.w3.org/2000/svg");
         std::unique_ptr<xmlXPathObject, decltype(&xmlXPathFreeObject)> result(

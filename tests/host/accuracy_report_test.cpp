@@ -39,8 +39,8 @@ TEST(AccuracyReport, IsWellFormedWithDiagramsSummaryAndTable)
     ASSERT_TRUE(xml.ok()) << out.str();
 
     EXPECT_EQ(xml.count("//svg:svg"), 2);
-    EXPECT_EQ(xml.count("//svg:svg/svg:g/svg:polygon"), 2);  // spectral locus
-    EXPECT_EQ(xml.count("//svg:polyline[svg:title]"), 2);    // Planckian locus
+    EXPECT_EQ(xml.count("//svg:svg/svg:g/svg:polygon"), 2); // spectral locus
+    EXPECT_EQ(xml.count("//svg:polyline[svg:title]"), 2);   // Planckian locus
     // Each light's true point, the plug-in's line and mark where it gave colour, the baseline's mark.
     EXPECT_EQ(xml.count("//svg:circle[svg:title[contains(., ': true')]]"), 2 * 3);
     EXPECT_EQ(xml.count("//svg:circle[svg:title[contains(., ': plug-in')]]"), 2 * 2);

@@ -1,6 +1,6 @@
 // Loading the plug-in bundle through its registration, as the event system does.
-#include "host/emulator/Bundle.h"
 #include "common/TestSupport.h"
+#include "host/emulator/Bundle.h"
 
 #include <gtest/gtest.h>
 
@@ -8,10 +8,7 @@
 
 namespace {
 
-void write(const std::filesystem::path& path, const std::string& text)
-{
-    std::ofstream(path) << text;
-}
+void write(const std::filesystem::path& path, const std::string& text) { std::ofstream(path) << text; }
 
 TEST(Bundle, LoadsTheBuiltBundleAndHandsOutFilters)
 {

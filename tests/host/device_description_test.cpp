@@ -5,9 +5,9 @@
 // skipped (the unit's service was leaked when making the unit failed on one).
 // A value can still fail when the unit is made, after the check: its data
 // file may be gone by then.
+#include "common/TestSupport.h"
 #include "host/emulator/DeviceDescription.h"
 #include "host/emulator/Unit.h"
-#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 

@@ -3,6 +3,7 @@
 // with its own calibration, builds its per-chip database, finds it again on
 // the next start and estimates the colour of light its model sensor sees.
 #include "PlugInColour.h"
+#include "common/TestSupport.h"
 #include "host/emulator/Bundle.h"
 #include "host/emulator/DeviceDescription.h"
 #include "host/emulator/Unit.h"
@@ -10,7 +11,6 @@
 #include "spectra/CieIlluminants.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
-#include "common/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
 
@@ -42,17 +42,37 @@ const std::vector<SampleUnit>& sampleUnits()
         {"xwcl-14", {"store/XwCl"}, "colour5.csv", "XwCl version = v3.2\n", 193, false},
         {"xwcl-35", {"store/XwCl"}, "rgbc4.csv", "XwCl version = v2.4\n", 145, false},
         {"xwcl-62", {"store/XwCA"}, "colour6.csv", "XwCl version = v4.0\n", 220, false},
-        {"vd6287-v1", {"store/XwCl"}, "colour5.csv", "QVT calibration data converted from v1 to v3. New size = 10348\n",
-         776, true},
+        {"vd6287-v1",
+         {"store/XwCl"},
+         "colour5.csv",
+         "QVT calibration data converted from v1 to v3. New size = 10348\n",
+         776,
+         true},
         {"vd6287-v3", {"store/XwCM"}, "colour5.csv", "XwCl calibration version = v3.1\n", 776, true},
-        {"sysconfig-r0", {"registry/alsCalibration.bin"}, "rgbc4.csv",
-         "Found calibration for orientation = 1, senzorType = 2, chipType = 0 \n", 145, false},
-        {"sysconfig-r1", {"registry/alsCalibration.bin"}, "rgbc4.csv",
-         "Found calibration for orientation = 1, senzorType = 2, chipType = 0 \n", 0, false},
-        {"sysconfig-aux", {"registry/alsCalibration.bin", "registry/alsAuxCalibration.bin"}, "rgbc4.csv",
-         "ALS auxiliary calibration found \n", 145, false},
-        {"sysconfig-vd6286", {"registry/alsCalibration.bin"}, "colour5.csv",
-         "Found calibration for orientation = 1, senzorType = 7, chipType = 3 \n", 193, false},
+        {"sysconfig-r0",
+         {"registry/alsCalibration.bin"},
+         "rgbc4.csv",
+         "Found calibration for orientation = 1, senzorType = 2, chipType = 0 \n",
+         145,
+         false},
+        {"sysconfig-r1",
+         {"registry/alsCalibration.bin"},
+         "rgbc4.csv",
+         "Found calibration for orientation = 1, senzorType = 2, chipType = 0 \n",
+         0,
+         false},
+        {"sysconfig-aux",
+         {"registry/alsCalibration.bin", "registry/alsAuxCalibration.bin"},
+         "rgbc4.csv",
+         "ALS auxiliary calibration found \n",
+         145,
+         false},
+        {"sysconfig-vd6286",
+         {"registry/alsCalibration.bin"},
+         "colour5.csv",
+         "Found calibration for orientation = 1, senzorType = 7, chipType = 3 \n",
+         193,
+         false},
     };
     return units;
 }

@@ -9,6 +9,7 @@
 // moves the plug-in away from this estimate. Where both are far from the
 // truth (line spectra), the loss belongs to the sensor, not to the path.
 #include "PlugInColour.h"
+#include "common/TestSupport.h"
 #include "host/emulator/Bundle.h"
 #include "host/emulator/Unit.h"
 #include "host/inputs/UnitSpectra.h"
@@ -16,7 +17,6 @@
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
 #include "spectra/TestLights.h"
-#include "common/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
 

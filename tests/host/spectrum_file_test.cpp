@@ -1,11 +1,11 @@
 // Light spectra from files: CGATS through lcms2, two-column CSV, other grids
 // resampled, and files that give no spectrum named with the reason.
+#include "common/TestSupport.h"
 #include "host/inputs/SpectrumFile.h"
 #include "spectra/CieData.h"
 #include "spectra/CieIlluminants.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/Planck.h"
-#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 
@@ -69,7 +69,7 @@ TEST(SpectrumFile, FilesWithoutASpectrumNameFileLineAndReason)
 {
     struct Case {
         const char* name;
-        const char* text; // nullptr: no such file
+        const char* text;  // nullptr: no such file
         std::string error; // what follows the file's path
         bool exact = true;
     };

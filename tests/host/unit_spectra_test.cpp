@@ -1,14 +1,14 @@
 // A unit's channel spectra as its calibration stores them: found where the
 // plug-in looks, decoded by the codec, in the channel order the driver reports.
 #include "PlugInColour.h"
+#include "common/TestSupport.h"
 #include "host/emulator/Bundle.h"
-#include "host/inputs/SyntheticReading.h"
 #include "host/emulator/Unit.h"
+#include "host/inputs/SyntheticReading.h"
 #include "host/inputs/UnitSpectra.h"
 #include "host/recordcodec/RecordCodec.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
-#include "common/TestSupport.h"
 
 #include <VantishPlatform/DispatchControl.h>
 

@@ -3,9 +3,9 @@
 // answered with one clear error naming what and where, failing only when
 // nothing could be done.
 #include "ReportXml.h"
+#include "common/TestSupport.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/TestLights.h"
-#include "common/TestSupport.h"
 
 #include <gtest/gtest.h>
 
@@ -216,35 +216,53 @@ TEST_F(VantishCommand, BadInputIsNamedAndOnlyNothingDoneFails)
         std::string err;
         Match match = Match::Exact;
         std::vector<std::string> out = {}; // texts the output holds
-        int outLines = -1; // 0: no output at all
+        int outLines = -1;                 // 0: no output at all
     };
     const std::string xwca = device("xwca-t2");
     const Case cases[] = {
         {"run nowhere.json --events - < /dev/null", 2, "vantish: nowhere.json: cannot open the device description\n"},
         {"synth broken.json --source cie-a", 2, "vantish synth: broken.json: not valid JSON: ", Match::Prefix},
         {"eval empty.json", 2, "vantish eval: empty.json: not valid JSON: ", Match::Prefix},
-        {"synth " + device("basic-rgbc") + " --source cie-a", 2,
-         "basic-rgbc/device.json: the unit has no factory store and no registry calibration", Match::Contains, {}, 0},
-        {"run " + xwca + " --events events.csv", 0, "vantish: events.csv:3: field 'c1': 'abc' is not a number\n",
-         Match::Exact, {}, 1 + 2},
+        {"synth " + device("basic-rgbc") + " --source cie-a",
+         2,
+         "basic-rgbc/device.json: the unit has no factory store and no registry calibration",
+         Match::Contains,
+         {},
+         0},
+        {"run " + xwca + " --events events.csv",
+         0,
+         "vantish: events.csv:3: field 'c1': 'abc' is not a number\n",
+         Match::Exact,
+         {},
+         1 + 2},
         {"run " + xwca + " --events bad.csv", 1, "vantish: bad.csv:2: field 'c0': 'x' is not a number\n"},
         {"run " + xwca + " --events nothing.csv", 1,
          "vantish: nothing.csv: no samples (the input is empty or only a header)\n"},
-        {"run " + device("basic-rgbc") + " --events utf8.csv", 0,
+        {"run " + device("basic-rgbc") + " --events utf8.csv",
+         0,
          "vantish: utf8.csv:3: field '\xFF': the key is not UTF-8 text\n"
          "vantish: utf8.csv:4: field 'RGBCOverride': property value: the text is not UTF-8\n",
-         Match::Exact, {"\n0,", "\n1,"}, 1 + 2},
+         Match::Exact,
+         {"\n0,", "\n1,"},
+         1 + 2},
         {"synth " + xwca + " --spectrum narrow.csv", 2,
          "vantish synth: narrow.csv: the spectrum covers 500–1000 nm; it must cover the visible range 400–700 nm\n"},
         {"synth " + xwca + " --spectrum empty.sp", 2, "vantish synth: empty.sp: empty file, no spectrum\n"},
         {"synth " + xwca + " --source no-such-light", 2, "--source no-such-light: no such light", Match::Contains},
-        {"eval " + xwca + " --spectra lights", 0, "vantish eval: lights/word.csv:2: 'bright' is not a number\n",
-         Match::Exact, {"\nwide ", "over 1 lights"}},
+        {"eval " + xwca + " --spectra lights",
+         0,
+         "vantish eval: lights/word.csv:2: 'bright' is not a number\n",
+         Match::Exact,
+         {"\nwide ", "over 1 lights"}},
         {"eval " + xwca + " --spectra lights/word.csv", 2,
          "vantish eval: lights/word.csv:2: 'bright' is not a number\nvantish eval: no light to evaluate\n"},
         // A report that cannot be written stops the evaluation before it starts.
-        {"eval " + xwca + " --report blocked/report.html", 2,
-         "vantish eval: blocked/report.html: cannot write the report\n", Match::Exact, {}, 0},
+        {"eval " + xwca + " --report blocked/report.html",
+         2,
+         "vantish eval: blocked/report.html: cannot write the report\n",
+         Match::Exact,
+         {},
+         0},
         {"lightdb info notes.sqlite", 2, "vantish lightdb info: notes.sqlite: cannot read (file is not a database)\n"},
     };
     for (const Case& c : cases) {
@@ -252,12 +270,16 @@ TEST_F(VantishCommand, BadInputIsNamedAndOnlyNothingDoneFails)
         const Outcome o = run(c.args);
         EXPECT_EQ(o.status, c.status);
         switch (c.match) {
-        case Match::Exact: EXPECT_EQ(o.err, c.err); break;
+        case Match::Exact:
+            EXPECT_EQ(o.err, c.err);
+            break;
         case Match::Prefix:
             EXPECT_EQ(o.err.rfind(c.err, 0), 0u) << o.err;
             EXPECT_EQ(lineCount(o.err), 1) << o.err;
             break;
-        case Match::Contains: EXPECT_NE(o.err.find(c.err), std::string::npos) << o.err; break;
+        case Match::Contains:
+            EXPECT_NE(o.err.find(c.err), std::string::npos) << o.err;
+            break;
         }
         for (const std::string& text : c.out)
             EXPECT_NE(o.out.find(text), std::string::npos) << text << " in\n" << o.out;

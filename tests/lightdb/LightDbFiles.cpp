@@ -19,7 +19,8 @@ void runSql(const std::filesystem::path& file, const std::string& sql)
     sqlite3* db = nullptr;
     ASSERT_EQ(sqlite3_open(file.c_str(), &db), SQLITE_OK) << file;
     char* error = nullptr;
-    EXPECT_EQ(sqlite3_exec(db, sql.c_str(), nullptr, nullptr, &error), SQLITE_OK) << (error ? error : "") << "\n" << sql;
+    EXPECT_EQ(sqlite3_exec(db, sql.c_str(), nullptr, nullptr, &error), SQLITE_OK) << (error ? error : "") << "\n"
+                                                                                  << sql;
     sqlite3_free(error);
     sqlite3_close(db);
 }

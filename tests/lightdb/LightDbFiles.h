@@ -2,8 +2,8 @@
 // temporary folders that the device paths are mapped onto.
 #pragma once
 
-#include "lightdb/LDBMInfo.h"
 #include "common/TestSupport.h"
+#include "lightdb/LDBMInfo.h"
 
 #include <gtest/gtest.h>
 
@@ -34,7 +34,10 @@ void writeReference(const std::filesystem::path& file, const std::string& versio
 class LightDbTest : public ::testing::Test {
 protected:
     LightDbTest();
-    std::filesystem::path bigDB(const char* name = "bzlight.sqlite") const { return system_.path() / "Vantish.plugin" / name; }
+    std::filesystem::path bigDB(const char* name = "bzlight.sqlite") const
+    {
+        return system_.path() / "Vantish.plugin" / name;
+    }
     std::filesystem::path cacheFile(int orientation) const;
 
     vt::DeviceRoots roots_;

@@ -86,7 +86,8 @@ TEST_F(BigDBTest, EveryIdMustAppearExactlyOnce)
         ldbtest::writeReference(bigDB(), "1.0", c.sources, rowsWithIds(c.ids));
         Recorder r;
         const LDBMInfo info = withSources(c.sources);
-        EXPECT_EQ(LDBMCode(LDBMParseBigDB(&info, record, &r, BigDBTypeDefault)), c.result) << ::testing::PrintToString(c.ids);
+        EXPECT_EQ(LDBMCode(LDBMParseBigDB(&info, record, &r, BigDBTypeDefault)), c.result)
+            << ::testing::PrintToString(c.ids);
         EXPECT_EQ(r.ids, c.consumed) << ::testing::PrintToString(c.ids);
     }
 }

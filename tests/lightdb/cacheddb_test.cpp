@@ -46,8 +46,9 @@ protected:
         Matrices m = channelSpectra(channels);
         m.bindOutputs(db);
         EXPECT_EQ(LDBMParseBigDB(&db.dbInfo, ProgressCallback, &m, BigDBTypeDefault), LDBMResult::Ok);
-        EXPECT_EQ(LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(),
-                                    key.orientation, algo, channels, key.chipId, key.smallDBVersion), LDBMResult::Ok);
+        EXPECT_EQ(LDBMCreateSmallDB(&db.dbInfo, db.dbXYZ.data(), db.dbChannelResponses.data(), key.orientation, algo,
+                                    channels, key.chipId, key.smallDBVersion),
+                  LDBMResult::Ok);
         return false;
     }
 
@@ -101,7 +102,8 @@ TEST_F(CachedDBTest, BuildsOnceThenLoadsTheSameArrays)
     algo = 4;
     SpectralDatabase built;
     ASSERT_FALSE(loadOrBuild(built));
-    EXPECT_EQ(log.messages(), (std::vector<std::string>{"nSources: 3 nChannels: 5\n", "Cached DB not found. Recreating"}));
+    EXPECT_EQ(log.messages(),
+              (std::vector<std::string>{"nSources: 3 nChannels: 5\n", "Cached DB not found. Recreating"}));
     EXPECT_EQ(built.dbInfo.algo, -1) << "the reference Info";
     EXPECT_FALSE(allZero(built.dbChannelResponses));
 

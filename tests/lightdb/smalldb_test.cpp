@@ -61,8 +61,8 @@ protected:
     }
 
     std::vector<float> xyz{0.25f, 123.456789f, 3.0f, 1e-3f, 0.5f, 6.0f, 7.125f, 8.0f, 95047.0f};
-    std::vector<float> responses{10.5f, 11.0f, 12.0f, 20.0f, 21.0f, 22.0f, 30.0f, 31.0f, 32.0f,
-                                 40.0f, 41.0f, 42.0f, 0.000123f, 51.0f, 52.0f};
+    std::vector<float> responses{10.5f, 11.0f, 12.0f, 20.0f, 21.0f,     22.0f, 30.0f, 31.0f,
+                                 32.0f, 40.0f, 41.0f, 42.0f, 0.000123f, 51.0f, 52.0f};
 };
 
 // Equal to the six decimals the file keeps.

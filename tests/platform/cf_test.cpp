@@ -205,8 +205,7 @@ TEST(CFDescription, ReadableTextForEveryValueType)
     CFDictionarySetValue(dict.get(), CFSTR("b"), array.get());
     CFDictionarySetValue(dict.get(), CFSTR("a"), kCFBooleanTrue);
     EXPECT_EQ(vt::describe(dict.get()), "{b = (1, two); a = true; }");
-    EXPECT_EQ(vt::describe(own(CFErrorCreate(nullptr, CFSTR("QVT"), -3, nullptr)).get()),
-              "Error Domain=QVT Code=-3");
+    EXPECT_EQ(vt::describe(own(CFErrorCreate(nullptr, CFSTR("QVT"), -3, nullptr)).get()), "Error Domain=QVT Code=-3");
 }
 
 TEST(CFDictionary, KeysMatchByValueAndOrderIsKept)

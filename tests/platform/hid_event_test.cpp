@@ -99,8 +99,8 @@ TEST(HIDEvent, CopyIsDeep)
     auto copy = own(IOHIDEventCreateCopy(nullptr, original.get()));
     EXPECT_EQ(IOHIDEventGetTimeStamp(copy.get()), 42u);
     EXPECT_EQ(IOHIDEventGetDoubleValue(copy.get(), kIOHIDEventFieldAmbientLightColorComponent1), 100.0);
-    auto copiedChild = static_cast<IOHIDEventRef>(
-        const_cast<void*>(CFArrayGetValueAtIndex(IOHIDEventGetChildren(copy.get()), 0)));
+    auto copiedChild =
+        static_cast<IOHIDEventRef>(const_cast<void*>(CFArrayGetValueAtIndex(IOHIDEventGetChildren(copy.get()), 0)));
     ASSERT_NE(copiedChild, child.get());
 
     IOHIDEventGetDataValue(copiedChild, kIOHIDEventFieldVendorDefinedData)[0] = 9;

@@ -50,7 +50,8 @@ TEST(LogFormat, PrivacyAnnotationsAreDroppedAndObjectsPrintTheirDescription)
 // shift every later argument.
 TEST(LogFormat, StandardConversionsMatchPrintf)
 {
-    EXPECT_EQ(formatted("%hhu %hhd %hu %hd", 300, 200, 70000, 40000), printed("%hhu %hhd %hu %hd", 300, 200, 70000, 40000));
+    EXPECT_EQ(formatted("%hhu %hhd %hu %hd", 300, 200, 70000, 40000),
+              printed("%hhu %hhd %hu %hd", 300, 200, 70000, 40000));
     EXPECT_EQ(formatted("%ld|%lu|%lld|%llx", LONG_MIN, ULONG_MAX, LLONG_MIN, 0x1234567890abcdefULL),
               printed("%ld|%lu|%lld|%llx", LONG_MIN, ULONG_MAX, LLONG_MIN, 0x1234567890abcdefULL));
     EXPECT_EQ(formatted("%zu %zd %jd %td", SIZE_MAX, size_t(7), INTMAX_MIN, ptrdiff_t(-9)),
@@ -125,8 +126,11 @@ TEST(LogLevelsDeathTest, EnvironmentSetsTheStartingLevel)
     const struct {
         const char* value;
         VPLogLevel level;
-    } cases[] = {{"debug", VPLogLevel::Debug}, {"info", VPLogLevel::Info}, {"error", VPLogLevel::Error},
-                 {"off", VPLogLevel::Off}, {"nonsense", VPLogLevel::Default}};
+    } cases[] = {{"debug", VPLogLevel::Debug},
+                 {"info", VPLogLevel::Info},
+                 {"error", VPLogLevel::Error},
+                 {"off", VPLogLevel::Off},
+                 {"nonsense", VPLogLevel::Default}};
     for (const auto& c : cases) {
         setenv("VANTISH_LOG", c.value, 1);
         EXPECT_EXIT(std::exit(VPLogGetLevel() == c.level ? 0 : 1), ::testing::ExitedWithCode(0), "") << c.value;
@@ -195,11 +199,10 @@ TEST(LogEcho, OneLinePerMessageOnStderr)
     os_log(OS_LOG_DEFAULT, "plain");
     std::string err = ::testing::internal::GetCapturedStderr();
     VPLogSetEcho(std::getenv("VANTISH_TEST_LOG") != nullptr);
-    EXPECT_EQ(err,
-              "com.example.vantish:default error: Failed to parse ALS calibration data.\n"
-              "com.example.vantish:default default: Parsed big DB\n"
-              "com.example.vantish:default default: two\n\n"
-              "default: plain\n");
+    EXPECT_EQ(err, "com.example.vantish:default error: Failed to parse ALS calibration data.\n"
+                   "com.example.vantish:default default: Parsed big DB\n"
+                   "com.example.vantish:default default: two\n\n"
+                   "default: plain\n");
 }
 
 // Handles are kept per subsystem and category: a host that creates and

@@ -63,8 +63,8 @@ TEST_F(Registry, SearchPrefersTheEntryThenTheNearestAncestor)
     // The result is the caller's own reference.
     auto data = own(CFDataCreate(nullptr, reinterpret_cast<const UInt8*>("\x01\x00\x00\x00"), 4));
     VPRegistrySetProperty(root, CFSTR("IOHIDOrientationType"), data.get());
-    CFTypeRef found = IORegistryEntrySearchCFProperty(leaf, kIOServicePlane, CFSTR("IOHIDOrientationType"), nullptr,
-                                                      kTowardsParents);
+    CFTypeRef found =
+        IORegistryEntrySearchCFProperty(leaf, kIOServicePlane, CFSTR("IOHIDOrientationType"), nullptr, kTowardsParents);
     EXPECT_EQ(found, data.get());
     EXPECT_EQ(CFGetRetainCount(data.get()), 3);
     CFRelease(found);

@@ -20,8 +20,8 @@ TEST(VectorOps, MaxvHonoursStrideEmptyInputAndNaN)
         vDSP_Stride stride;
         vDSP_Length n;
         float max;
-    } cases[] = {{a, 2, 3, 2.5f},        {a, 1, 6, 90.0f},        {negative, 1, 3, -2.0f},
-                 {a, 1, 0, -INFINITY},   {nanFirst, 1, 3, nan},   {nanLater, 1, 3, nan}};
+    } cases[] = {{a, 2, 3, 2.5f},      {a, 1, 6, 90.0f},      {negative, 1, 3, -2.0f},
+                 {a, 1, 0, -INFINITY}, {nanFirst, 1, 3, nan}, {nanLater, 1, 3, nan}};
     for (const auto& c : cases) {
         SCOPED_TRACE(&c - cases);
         float result = 0;

@@ -2,9 +2,9 @@
 // with the shared plug-in holder and ALS events.
 #pragma once
 
-#include "plugin/TestAccess.h"
 #include "common/ALSEvents.h"
 #include "common/PlugInHolder.h"
+#include "plugin/TestAccess.h"
 
 #include <array>
 #include <cstdint>

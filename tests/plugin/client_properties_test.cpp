@@ -93,8 +93,8 @@ TEST_F(ClientProperties, RGBCArraysTakeOnlyNumbersAndTheDatabasesChannelCount)
 
     // Never stored past six values.
     parts(*plugin_).unit().dbChannelCount = 8;
-    set("RGBCOverride", array({integer(1), integer(2), integer(3), integer(4), integer(5), integer(6), integer(7),
-                               integer(8)}));
+    set("RGBCOverride",
+        array({integer(1), integer(2), integer(3), integer(4), integer(5), integer(6), integer(7), integer(8)}));
     EXPECT_EQ(rgbc(), (std::array<uint32_t, 6>{1, 2, 3, 4, 5, 6}));
     EXPECT_TRUE(log.contains("Override ch[5]: 6"));
     EXPECT_FALSE(log.contains("Override ch[6]: 7"));

@@ -39,7 +39,8 @@ TEST_F(CopyEvent, ColourSpaceZeroGetsTheLastResult)
     EXPECT_EQ(plugin->filterCopyEvent(event.get()), event.get());
     EXPECT_EQ(colourSpaceOf(event.get()), 1);
     EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{1.0, 2.0, 3.0}));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "Copy event with color = [1.000000, 2.000000, 3.000000], color space = 1"));
+    EXPECT_TRUE(
+        log.contains(OS_LOG_TYPE_INFO, "Copy event with color = [1.000000, 2.000000, 3.000000], color space = 1"));
 }
 
 TEST_F(CopyEvent, AColourAlreadyThereIsKept)

@@ -63,7 +63,7 @@ struct Source {
 // Spectrum of source i: Planckian for the first 14, tinted Planckian after.
 double spectrum(int i, double nm)
 {
-    static constexpr double kelvin[] = {2000, 2400, 2700, 3000, 3500, 4000, 4500,
+    static constexpr double kelvin[] = {2000, 2400, 2700, 3000, 3500, 4000,  4500,
                                         5000, 5500, 6500, 7500, 9000, 12000, 16000};
     if (i < 14)
         return planck(nm, kelvin[i]);

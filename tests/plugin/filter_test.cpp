@@ -59,10 +59,7 @@ protected:
     PlugIn plugin;
 };
 
-Record fourChannels(std::array<float, 6> c, float lux)
-{
-    return Record().sampleChannelCount(4).channels(c).lux(lux);
-}
+Record fourChannels(std::array<float, 6> c, float lux) { return Record().sampleChannelCount(4).channels(c).lux(lux); }
 
 } // namespace
 
@@ -113,7 +110,8 @@ TEST_F(Filter, SpikeBelowTheLuxLimitZeroesLevelAndColourAndLogs)
     EXPECT_EQ(eventXYZ(event.get()), (std::array<double, 3>{0, 0, 0}));
     EXPECT_EQ(colourSpaceOf(event.get()), 1);
     EXPECT_EQ(lastXYZOf(*plugin), (std::array<float, 3>{0, 0, 0}));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "ALS spike detected (type = 3). Lux = 5.000000, Channel ratio = 1.000000"));
+    EXPECT_TRUE(
+        log.contains(OS_LOG_TYPE_INFO, "ALS spike detected (type = 3). Lux = 5.000000, Channel ratio = 1.000000"));
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, "ALS spike is detected -> setting zero lux and zero color."));
 
     // At the low-lux limit the same channels are no spike: (0, 20, 10) scaled to 10 lux.
@@ -147,13 +145,19 @@ TEST_F(Filter, ChannelsReachingTheColour)
     const Case cases[] = {
         // (10, 0 + 20, 30) scaled to 100 lux; unclamped it would be (5, 15, 30).
         {"negative channels count as zero", [] {}, fourChannels({10, -5, 20, 30, 0, 0}, 100), {50, 100, 150}},
-        {"stale database channel count", [this] { parts(*plugin).unit().dbChannelCount = 5; },
-         fourChannels({10, 20, 30, 40, 0, 0}, 100), {20, 100, 80}},
-        {"chromaticity override with y = 0 is ignored", [this] { overrideChromaticity(*plugin, 0.3127, 0.0, 100.0); },
-         fourChannels({10, 20, 30, 40, 0, 0}, 100), {20, 100, 80}},
+        {"stale database channel count",
+         [this] { parts(*plugin).unit().dbChannelCount = 5; },
+         fourChannels({10, 20, 30, 40, 0, 0}, 100),
+         {20, 100, 80}},
+        {"chromaticity override with y = 0 is ignored",
+         [this] { overrideChromaticity(*plugin, 0.3127, 0.0, 100.0); },
+         fourChannels({10, 20, 30, 40, 0, 0}, 100),
+         {20, 100, 80}},
         // (10, 20 + 30, 40 + 50) scaled to 100 lux.
-        {"six-channel sensor feeds its last channels", [this] { useSixChannelSensor(); },
-         Record().sampleChannelCount(6).channels({1000, 10, 20, 30, 40, 50}).lux(100), {20, 100, 180}},
+        {"six-channel sensor feeds its last channels",
+         [this] { useSixChannelSensor(); },
+         Record().sampleChannelCount(6).channels({1000, 10, 20, 30, 40, 50}).lux(100),
+         {20, 100, 180}},
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(c.what);
@@ -215,7 +219,9 @@ TEST_F(Filter, RGBCOverrideReplacesChannelsInColourRecordAndRawFields)
         // (100, 500, 400) scaled to 50 lux.
         {false, fourChannels({1, 2, -3, 4, -5, 6}, 50), {100, 200, 300, 400, 0, 6}, {10, 50, 40}},
         // Six channels: the override lands after the skipped channel; (100, 200 + 300, 400 + 500) at 50 lux.
-        {true, Record().sampleChannelCount(6).channels({-7, 1, 2, 3, 4, 5}).lux(50), {0, 100, 200, 300, 400, 500},
+        {true,
+         Record().sampleChannelCount(6).channels({-7, 1, 2, 3, 4, 5}).lux(50),
+         {0, 100, 200, 300, 400, 500},
          {10, 50, 90}},
     };
     parts(*plugin).overrides().rgbcOverrideActive = 1;
@@ -256,14 +262,14 @@ TEST_F(Filter, XYZInRecordWritesTheResultAndComparesWithTheSensor)
     EXPECT_EQ(lastXYZOf(*plugin), result);
 
     const double x = result[0], y = result[1], z = result[2];
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG,
-                             format("[ColorCalc] ts=777 XYZAP=[%f %f %f] XYZAOP=[%f %f %f]", x, y, z, double(20.05f),
-                                    99.0, 170.0)));
+    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, format("[ColorCalc] ts=777 XYZAP=[%f %f %f] XYZAOP=[%f %f %f]", x, y, z,
+                                                       double(20.05f), 99.0, 170.0)));
     const char* diff = "[ColorCalc] diff(XYZAP[%d], XYZAOP[%d]) = diff(%f, %f) = %f treshholdValue(0.50%%) = %f "
                        "isBelowTreshhold = %s";
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG,
                              format(diff, 0, 0, x, double(20.05f), std::abs(x - double(20.05f)), x * 0.005, "YES")));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEBUG, format(diff, 2, 2, z, 170.0, std::abs(z - 170.0), z * 0.005, "!!NO!!")));
+    EXPECT_TRUE(
+        log.contains(OS_LOG_TYPE_DEBUG, format(diff, 2, 2, z, 170.0, std::abs(z - 170.0), z * 0.005, "!!NO!!")));
     // Y is the lux by construction; it is not compared.
     for (const auto& message : log.messages())
         EXPECT_EQ(message.rfind("[ColorCalc] diff(XYZAP[1]", 0), std::string::npos);

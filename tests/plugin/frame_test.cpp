@@ -1,8 +1,8 @@
 // The plug-in object as the host sees it: factory, interface queries,
 // reference counting, and the log handles.
-#include "support/Log.h"
-#include "plugin/TestAccess.h"
 #include "common/TestSupport.h"
+#include "plugin/TestAccess.h"
+#include "support/Log.h"
 
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/DispatchControl.h>
@@ -105,9 +105,10 @@ TEST(ReferenceCount, QueuedWorkKeepsTheInstanceAlive)
     VPDispatchSetDelayMode(VPDelayMode::Manual);
     VantishPlugIn* plugin = create();
     std::atomic<uint32_t> seen{0};
-    parts(*plugin).calibration().host().dispatchAfterRetained(dispatch_time(DISPATCH_TIME_NOW, 5 * int64_t(NSEC_PER_SEC)),
-                                  dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_HIGH, 0),
-                                  [plugin, &seen] { seen = parts(*plugin).unit().orientation.load(); });
+    parts(*plugin).calibration().host().dispatchAfterRetained(
+        dispatch_time(DISPATCH_TIME_NOW, 5 * int64_t(NSEC_PER_SEC)),
+        dispatch_get_global_queue(DISPATCH_QUEUE_PRIORITY_HIGH, 0),
+        [plugin, &seen] { seen = parts(*plugin).unit().orientation.load(); });
     parts(*plugin).unit().orientation = 7;
     EXPECT_EQ(plugin->Release(), 1u); // the host lets go; the queued work still holds it
     EXPECT_EQ(VPDispatchFireDelayed(), 1u);

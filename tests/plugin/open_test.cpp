@@ -145,9 +145,10 @@ TEST_F(Open, ReadsEveryConfigurationKey)
     EXPECT_EQ(parts(*plugin).unit().deviceColor, 2u);
     EXPECT_EQ(parts(*plugin).service(), service);
 
-    for (const char* line : {"IONameMatched=als,ct720 \n", "DeviceColor is 2", "Color algo override version = 5 from EDT\n",
-                             "Setting color algo lambda = 0.250000 from EDT\n", "Use channel ratio mitigation - YES, type = 3\n",
-                             "ChipID is 0x1234\n", "Found sensor type = 3\n"})
+    for (const char* line :
+         {"IONameMatched=als,ct720 \n", "DeviceColor is 2", "Color algo override version = 5 from EDT\n",
+          "Setting color algo lambda = 0.250000 from EDT\n", "Use channel ratio mitigation - YES, type = 3\n",
+          "ChipID is 0x1234\n", "Found sensor type = 3\n"})
         EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, line)) << line;
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_DEFAULT, "Plugin is opening on Dravik OS."));
 }
@@ -218,9 +219,10 @@ TEST_F(Open, CalibrationPropertiesChooseTheBringUp)
         CFBooleanRef sysConfig, spectrumToProcess;
         const char* line;
     };
-    for (const Case& c : {Case{nullptr, nullptr, "Getting QVT calibration...\n"},
-                          Case{kCFBooleanTrue, nullptr, "Use sysconfig calibration to calibrate sensor\n"},
-                          Case{kCFBooleanFalse, kCFBooleanTrue, "Don't use sysconfig calibration to calibrate sensor\n"}}) {
+    for (const Case& c :
+         {Case{nullptr, nullptr, "Getting QVT calibration...\n"},
+          Case{kCFBooleanTrue, nullptr, "Use sysconfig calibration to calibrate sensor\n"},
+          Case{kCFBooleanFalse, kCFBooleanTrue, "Don't use sysconfig calibration to calibrate sensor\n"}}) {
         SCOPED_TRACE(c.line);
         VPServicePublishProperty(service, CFSTR("SysConfigCalibration"), c.sysConfig);
         VPServicePublishProperty(service, CFSTR("ALSCalibrationSpectrumToProcess"), c.spectrumToProcess);

@@ -58,8 +58,7 @@ Record fullRecord()
         .filteredLuxValid(1);
 }
 
-const std::string kShortLine =
-    "[ALS] ts=1234.568 lux=123.457 xy=(0.300 0.400) chs=[10 20 30 40 N/A] copyEvent=0";
+const std::string kShortLine = "[ALS] ts=1234.568 lux=123.457 xy=(0.300 0.400) chs=[10 20 30 40 N/A] copyEvent=0";
 
 } // namespace
 
@@ -101,9 +100,9 @@ TEST_F(SampleLog, ZeroColourLogsZeroChromaticity)
     for (auto field : {kIOHIDEventFieldAmbientLightColorComponent0, kIOHIDEventFieldAmbientLightColorComponent1,
                        kIOHIDEventFieldAmbientLightColorComponent2})
         IOHIDEventSetDoubleValue(e.get(), field, 0.0);
-    EXPECT_EQ(logged(e.get(), false),
-              std::vector<std::string>{
-                  "[ALS] ts=1234.568 lux=123.457 xy=(0.000 0.000) chs=[10 20 30 40 N/A] copyEvent=0"});
+    EXPECT_EQ(
+        logged(e.get(), false),
+        std::vector<std::string>{"[ALS] ts=1234.568 lux=123.457 xy=(0.000 0.000) chs=[10 20 30 40 N/A] copyEvent=0"});
 }
 
 TEST_F(SampleLog, OnlyForSensorType8AndALSEventsAtTheDefaultLevel)

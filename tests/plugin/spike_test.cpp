@@ -7,8 +7,8 @@ namespace {
 
 struct Case {
     const char* what;
-    uint8_t P;               // channels in the sample
-    std::array<float, 6> c;  // c0..c5 as received
+    uint8_t P;              // channels in the sample
+    std::array<float, 6> c; // c0..c5 as received
     float lux;
     uint32_t T, V, sensorType;
     bool spike;

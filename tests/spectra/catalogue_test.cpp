@@ -37,11 +37,12 @@ TEST(Catalogue, NamesDenoteTheirModels)
     const Spectrum d65 = cieDaylight(6504.0);
     const Share shares[] = {{&d65, 0.7}, {&a, 0.3}};
     const Spectrum expected = atIlluminance(mixByIlluminance(shares), kReferenceLux);
-    for (int i = 0; i < kSamples; i += 50) EXPECT_NEAR(mix->spectrum[size_t(i)], expected[size_t(i)], 1e-9);
+    for (int i = 0; i < kSamples; i += 50)
+        EXPECT_NEAR(mix->spectrum[size_t(i)], expected[size_t(i)], 1e-9);
 
-    for (const char* name : {"cie-a", "cie-f12", "daylight-6500K", "led-450-565-115-5000K",
-                             "ledr-450-545-105-r630w90-3000K", "tri-4000K-duv0-c5", "hps-b12-ir10", "lps",
-                             "mh-ceramic-4000K", "ledv-405-3000K", "mix-d50-ledr3000-40"})
+    for (const char* name :
+         {"cie-a", "cie-f12", "daylight-6500K", "led-450-565-115-5000K", "ledr-450-545-105-r630w90-3000K",
+          "tri-4000K-duv0-c5", "hps-b12-ir10", "lps", "mh-ceramic-4000K", "ledv-405-3000K", "mix-d50-ledr3000-40"})
         EXPECT_NE(findSource(name), nullptr) << name;
 }
 
@@ -54,7 +55,8 @@ TEST(Catalogue, ReferenceSetsFitTheDatabaseAndDiffer)
     EXPECT_GT(dense.size(), base.size());
 
     std::set<std::string> families;
-    for (const Source* s : base) families.insert(s->family);
+    for (const Source* s : base)
+        families.insert(s->family);
     EXPECT_EQ(families, (std::set<std::string>{"cie", "daylight", "fluorescent", "led", "led-red", "metal-halide",
                                                "mix-incandescent", "mix-led", "planck", "sodium"}));
     EXPECT_EQ(base.front()->name, "planck-1800K");

@@ -12,7 +12,8 @@ using namespace spectra;
 
 TEST(Colorimetry, StandardIlluminantsHaveTheirPublishedChromaticities)
 {
-    for (const auto& [illuminant, published] : {std::pair{cieA(), Xy{0.4476, 0.4074}}, {cieD65(), Xy{0.3127, 0.3290}}}) {
+    for (const auto& [illuminant, published] :
+         {std::pair{cieA(), Xy{0.4476, 0.4074}}, {cieD65(), Xy{0.3127, 0.3290}}}) {
         const Xy xy = chromaticity(tristimulus(illuminant));
         EXPECT_NEAR(xy.x, published.x, 1e-3);
         EXPECT_NEAR(xy.y, published.y, 1e-3);

@@ -76,7 +76,8 @@ TEST(Models, IncandescentAndDaylightCarryInfraredWhileLedAndFluorescentDoNot)
     EXPECT_LT(infraredShare(*triPhosphorLamp({4000, 0.0, 0.05})), 0.06);
     EXPECT_LT(infraredShare(cieF(2)), 0.03);
     const Spectrum f11 = cieF(11);
-    for (int i = sampleAtOrBelow(782); i < kSamples; ++i) EXPECT_EQ(f11[size_t(i)], 0.0);
+    for (int i = sampleAtOrBelow(782); i < kSamples; ++i)
+        EXPECT_EQ(f11[size_t(i)], 0.0);
 }
 
 TEST(Models, SolvedSourcesLandOnTheirTargetColour)

@@ -3,8 +3,8 @@
 #include "spectra/Colorimetry.h"
 #include "spectra/ReferenceDatabase.h"
 
-#include "lightdb/LDBM.h"
 #include "common/TestSupport.h"
+#include "lightdb/LDBM.h"
 
 #include <VantishPlatform/Paths.h>
 #include <gtest/gtest.h>
@@ -37,7 +37,8 @@ int check(void* context, int id, float* xyz, float* spectrum, int sampleCount)
         xyz[2] != float(expected.Z))
         ++c.mismatches;
     for (int i = 0; i < sampleCount; ++i)
-        if (spectrum[i] != float(s[size_t(i)])) ++c.mismatches;
+        if (spectrum[i] != float(s[size_t(i)]))
+            ++c.mismatches;
     return 0;
 }
 
@@ -64,7 +65,8 @@ TEST(ReferenceDatabase, ThePlugInReadsBothShippedFilesCompletely)
 
         LDBMInfo info;
         sqlite3* db = nullptr;
-        ASSERT_EQ(sqlite3_open_v2(VPMapPath(LDBMBigDBPath(type)).c_str(), &db, SQLITE_OPEN_READONLY, nullptr), SQLITE_OK);
+        ASSERT_EQ(sqlite3_open_v2(VPMapPath(LDBMBigDBPath(type)).c_str(), &db, SQLITE_OPEN_READONLY, nullptr),
+                  SQLITE_OK);
         EXPECT_EQ(sqlite3_exec(db, "SELECT * FROM Info", LDBMReadInfoRow, &info, nullptr), SQLITE_OK);
         sqlite3_close(db);
         EXPECT_EQ(info.version, file.version);
@@ -87,7 +89,8 @@ TEST(ReferenceDatabase, IsReproducibleAndLeavesNoSideFiles)
     EXPECT_EQ(bytesOf(dir.path() / "a.sqlite"), bytesOf(dir.path() / "b.sqlite"));
 
     std::vector<std::string> files;
-    for (const auto& entry : std::filesystem::directory_iterator(dir.path())) files.push_back(entry.path().filename());
+    for (const auto& entry : std::filesystem::directory_iterator(dir.path()))
+        files.push_back(entry.path().filename());
     std::sort(files.begin(), files.end());
     EXPECT_EQ(files, (std::vector<std::string>{"a.sqlite", "b.sqlite"}));
 }

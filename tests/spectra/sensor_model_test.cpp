@@ -1,8 +1,8 @@
 // Sensor CSV files: the shipped model sensors read back as silicon colour
 // sensors with near-infrared leakage, and malformed files are refused with
 // the line at fault.
-#include "spectra/SensorModel.h"
 #include "common/TestSupport.h"
+#include "spectra/SensorModel.h"
 
 #include <gtest/gtest.h>
 

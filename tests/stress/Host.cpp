@@ -59,9 +59,7 @@ std::string describe(const unit::EventColour& colour)
 Plan Plan::scaled(double scale)
 {
     Plan plan;
-    auto at = [scale](unsigned full, unsigned least) {
-        return std::max(least, unsigned(std::lround(full * scale)));
-    };
+    auto at = [scale](unsigned full, unsigned least) { return std::max(least, unsigned(std::lround(full * scale))); };
     plan.lifetimesPerHost = at(plan.lifetimesPerHost, 3);
     plan.eventsPerLifetime = at(plan.eventsPerLifetime, 120);
     return plan;

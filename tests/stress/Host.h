@@ -49,7 +49,7 @@ struct Tally {
     unsigned events = 0, copies = 0, rebuilds = 0, lifetimes = 0;
     unsigned releasedWithWorkQueued = 0; // the host's release was not the last
     unsigned fromDefault = 0, fromSecond = 0, overridden = 0, withoutColour = 0;
-    double largestDeviation = 0.0; // from the chromaticity of the database the colour was matched to
+    double largestDeviation = 0.0;   // from the chromaticity of the database the colour was matched to
     unsigned faultCount = 0;         // colours from no whole database, or missing
     std::vector<std::string> faults; // the first few of them
 

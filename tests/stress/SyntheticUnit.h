@@ -151,7 +151,7 @@ inline std::vector<uint8_t> xwclRecord()
 {
     constexpr size_t kHeader = 76, kEntry = 5080;
     std::vector<uint8_t> b(kHeader + kEntry, 0);
-    putLE(b, 4, 2, 1);  // version 2.3
+    putLE(b, 4, 2, 1); // version 2.3
     putLE(b, 5, 3, 1);
     putLE(b, 10, 1, 1); // entry 1
     putLE(b, 16, 14, 1);

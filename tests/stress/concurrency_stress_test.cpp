@@ -9,8 +9,8 @@
 // VANTISH_STRESS_SCALE sizes the run: 1 is the full run (about 100 000
 // filtered events, 72 rebuilds, 48 instance lifetimes); the default, 0.04,
 // keeps the ordinary test run to about a second.
-#include "stress/Host.h"
 #include "common/TestSupport.h"
+#include "stress/Host.h"
 
 #include <VantishPlatform/DeviceState.h>
 #include <VantishPlatform/DispatchControl.h>

@@ -5,8 +5,8 @@
 #pragma once
 
 #include "common/PlugInHolder.h"
-#include "sysconfig/SysConfigCalibration.h"
 #include "common/TestSupport.h"
+#include "sysconfig/SysConfigCalibration.h"
 
 #include <VantishPlatform/DispatchControl.h>
 #include <VantishPlatform/HIDHost.h>
@@ -124,7 +124,9 @@ struct GenericEntry {
         e.u8(17, gain1).u8(18, gain2).u8(19, nChannels).u8(20, nGains);
         for (size_t c = 0; c < nChannels; ++c) {
             const size_t b = 24 + blockSize() * c;
-            e.u8(b, uint8_t(channel.dark + c)).u16(b + 1, uint16_t(channel.offsetThousandths + c)).u8(b + 3, channel.paramB);
+            e.u8(b, uint8_t(channel.dark + c))
+                .u16(b + 1, uint16_t(channel.offsetThousandths + c))
+                .u8(b + 3, channel.paramB);
             for (size_t k = 0; k < nGains; ++k)
                 e.u16(b + 4 + 2 * k, uint16_t(channel.gainBase + 64 * k));
         }
@@ -263,7 +265,8 @@ protected:
         entry_ = VPRegistryCreateEntry(kRegistryID, parent_);
         service_ = VPServiceCreate(kRegistryID);
         parts(*plugin_).service() = service_;
-        parts(*plugin_).registryEntry() = IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(kRegistryID));
+        parts(*plugin_).registryEntry() =
+            IOServiceGetMatchingService(kIOMainPortDefault, IORegistryEntryIDMatching(kRegistryID));
         parts(*plugin_).unit().orientation = 1;
         parts(*plugin_).unit().numberOfChannels = 4;
         parts(*plugin_).unit().dbChannelCount = 4;

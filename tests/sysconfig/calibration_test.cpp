@@ -53,15 +53,15 @@ TEST_F(RegistryCalibration, GenericRecordFromTheEntry)
     EXPECT_EQ(parts(*plugin_).unit().algoVersion.load(), 5);
     EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO,
                              "supported calibration version 1,0 with size " + std::to_string(b.size()) + "\n"));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO,
-                             "Found calibration for orientation = 1, senzorType = 2, chipType = 0 \n"));
+    EXPECT_TRUE(
+        log.contains(OS_LOG_TYPE_INFO, "Found calibration for orientation = 1, senzorType = 2, chipType = 0 \n"));
 
     const auto r = receivedRecord();
     ASSERT_EQ(r.size(), 145u);
     EXPECT_EQ(r[0], 1);
-    EXPECT_EQ(u32At(r, 1), 1u);       // configuration-supplied
-    EXPECT_EQ(u32At(r, 5), 0u);       // chip type
-    EXPECT_EQ(r[9], 1);               // entry count
+    EXPECT_EQ(u32At(r, 1), 1u); // configuration-supplied
+    EXPECT_EQ(u32At(r, 5), 0u); // chip type
+    EXPECT_EQ(r[9], 1);         // entry count
     EXPECT_EQ(u16At(r, 10), 145);
     EXPECT_EQ(u16At(r, 12), 0x8000); // 0x200 / 256 = 2.0 in Q2.14
     EXPECT_EQ(u16At(r, 14), 250);
@@ -224,8 +224,8 @@ TEST_F(RegistryCalibration, VD6286EntryMustHoldTheWholeLayout)
         vt::LogCapture log;
         publish("alsCalibration", blob({entry.bytes()}));
         EXPECT_FALSE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, true));
-        EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR,
-                                 "Calibration data are smaller than ALSCalibrationDataVD6286 structure."));
+        EXPECT_TRUE(
+            log.contains(OS_LOG_TYPE_ERROR, "Calibration data are smaller than ALSCalibrationDataVD6286 structure."));
         EXPECT_FALSE(log.contains("Algo version: 2 NSamples: 401\n")); // no spectrum read either
     }
     entry.entrySize = 4156;

@@ -33,7 +33,8 @@ void expectDatabase(const SpectralDatabasePtr& db, const std::vector<double>& ex
         EXPECT_FLOAT_EQ(db->dbXYZ[i + n], float(2 * i + 1));
         EXPECT_FLOAT_EQ(db->dbXYZ[i + 2 * n], float(3 * i + 1));
         for (size_t c = 0; c < expected.size(); ++c)
-            EXPECT_NEAR(db->dbChannelResponses[c * n + i], expected[c], 1e-3 * expected[c]) << "source " << i << " channel " << c;
+            EXPECT_NEAR(db->dbChannelResponses[c * n + i], expected[c], 1e-3 * expected[c])
+                << "source " << i << " channel " << c;
     }
 }
 
@@ -215,8 +216,7 @@ TEST_F(Database, AuxiliaryBlobsThatCompensateNothing)
          "alsAuxCalibration entry of 16 bytes is too short for its coefficients (56 bytes).\n"},
         {zeroSize, OS_LOG_TYPE_ERROR,
          "alsAuxCalibration entry 0 at offset 8: entry size 0 is smaller than its subheader.\n"},
-        {Bytes(5), OS_LOG_TYPE_ERROR,
-         "alsAuxCalibration of 5 bytes is shorter than its header.\n"},
+        {Bytes(5), OS_LOG_TYPE_ERROR, "alsAuxCalibration of 5 bytes is shorter than its header.\n"},
     };
     for (const auto& [aux, type, line] : cases) {
         SCOPED_TRACE(line);
@@ -288,7 +288,7 @@ TEST_F(Database, QueuedWriteOutlivesTheHostsRelease)
         const auto guard = parts(*plugin_).calibration().lock();
         EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), true, true, true));
         EXPECT_EQ(parts(*plugin_).refCount(), 2u); // the task holds the instance
-        plugin_.release(); // the host lets go
+        plugin_.release();                         // the host lets go
     }
     VPDispatchDrain();
     EXPECT_TRUE(log.contains("Small DB has been created\n"));
@@ -302,7 +302,8 @@ TEST_F(Database, QueuedWriteOfAReplacedDatabaseIsSkipped)
     publish("alsCalibration", blob({GenericEntry{}.bytes()}));
     std::optional<Calibration::Guard> lock;
     lock.emplace(parts(*plugin_).calibration());
-    EXPECT_TRUE(processSysConfigCalibration(parts(*plugin_).calibration(), true, false, true)); // its task waits for the lock
+    EXPECT_TRUE(
+        processSysConfigCalibration(parts(*plugin_).calibration(), true, false, true)); // its task waits for the lock
     const auto first = parts(*plugin_).databases().snapshot().db;
 
     // A rebuild publishes a newer database whose own cache write fails.
@@ -315,7 +316,8 @@ TEST_F(Database, QueuedWriteOfAReplacedDatabaseIsSkipped)
     VPDispatchDrain();
 
     // The older task neither wrote its arrays over the cache nor switched colour on.
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_INFO, "A newer database has been published; this one's cache is not written.\n"));
+    EXPECT_TRUE(
+        log.contains(OS_LOG_TYPE_INFO, "A newer database has been published; this one's cache is not written.\n"));
     EXPECT_FALSE(std::filesystem::exists(cacheFile()));
     EXPECT_FALSE(parts(*plugin_).databases().isReady());
     EXPECT_EQ(parts(*plugin_).databases().snapshot().db, second);

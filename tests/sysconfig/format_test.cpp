@@ -47,7 +47,7 @@ TEST(FixedPoint, SaturatesAtTheInt32Limits)
     EXPECT_EQ(toQ16_16(-1e9f), min);
     EXPECT_EQ(toQ16_16(std::numeric_limits<float>::infinity()), max);
     EXPECT_EQ(toQ16_16(std::nanf("")), 0);
-    EXPECT_EQ(toQ2_14(1e9f), 0xFFFF); // low half of 0x7FFFFFFF
+    EXPECT_EQ(toQ2_14(1e9f), 0xFFFF);  // low half of 0x7FFFFFFF
     EXPECT_EQ(toQ2_14(-1e9f), 0x0000); // low half of 0x80000000
 }
 
@@ -87,8 +87,8 @@ TEST(EntryWalk, RejectsAnEntryBodyPastTheEnd)
     // The matching entry says 40 bytes, the blob holds 16 of them.
     const Bytes b = blob({smallEntry(1, 40, 16)});
     EXPECT_FALSE(findCalibrationEntry(span(b), 1, 1, "alsCalibration"));
-    EXPECT_TRUE(log.contains(OS_LOG_TYPE_ERROR,
-                             "alsCalibration entry 0 at offset 8: 40 bytes run past the end of the data (24 bytes).\n"));
+    EXPECT_TRUE(log.contains(
+        OS_LOG_TYPE_ERROR, "alsCalibration entry 0 at offset 8: 40 bytes run past the end of the data (24 bytes).\n"));
     // An entry skipped on the way is checked just the same.
     const Bytes two = blob({smallEntry(1, 400, 16), smallEntry(2, 8)});
     EXPECT_FALSE(findCalibrationEntry(span(two), 2, 2, "alsCalibration"));

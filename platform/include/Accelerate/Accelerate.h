@@ -12,8 +12,7 @@ extern "C" {
 // *C = the largest of the N elements A[0], A[IA], ...; -infinity when N is 0.
 void vDSP_maxv(const float* A, vDSP_Stride IA, float* C, vDSP_Length N);
 // C[n*IC] = A[n*IA] * B[n*IB] for n < N.
-void vDSP_vmul(const float* A, vDSP_Stride IA, const float* B, vDSP_Stride IB, float* C, vDSP_Stride IC,
-               vDSP_Length N);
+void vDSP_vmul(const float* A, vDSP_Stride IA, const float* B, vDSP_Stride IB, float* C, vDSP_Stride IC, vDSP_Length N);
 // y[i] = sqrt(x[i]) for i < *n.
 void vvsqrtf(float* y, const float* x, const int* n);
 

@@ -25,11 +25,11 @@ bool os_log_type_enabled(os_log_t log, os_log_type_t type);
 void _os_log_emit(os_log_t log, os_log_type_t type, const char* format, ...);
 }
 
-#define os_log_with_type(log, type, format, ...)                   \
-    do {                                                           \
-        os_log_t _vl_log = (log);                                  \
-        os_log_type_t _vl_type = (type);                           \
-        if (os_log_type_enabled(_vl_log, _vl_type))                \
+#define os_log_with_type(log, type, format, ...)                    \
+    do {                                                            \
+        os_log_t _vl_log = (log);                                   \
+        os_log_type_t _vl_type = (type);                            \
+        if (os_log_type_enabled(_vl_log, _vl_type))                 \
             _os_log_emit(_vl_log, _vl_type, format, ##__VA_ARGS__); \
     } while (0)
 

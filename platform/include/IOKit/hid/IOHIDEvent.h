@@ -64,8 +64,8 @@ CFArrayRef IOHIDEventGetChildren(IOHIDEventRef event);
 // ---- Creating events (host and driver side) --------------------------------
 IOHIDEventRef IOHIDEventCreate(CFAllocatorRef allocator, IOHIDEventType type, uint64_t timeStamp, IOOptionBits options);
 IOHIDEventRef IOHIDEventCreateVendorDefinedEvent(CFAllocatorRef allocator, uint64_t timeStamp, uint32_t usagePage,
-                                                 uint32_t usage, uint32_t version, const uint8_t* data,
-                                                 CFIndex length, IOOptionBits options);
+                                                 uint32_t usage, uint32_t version, const uint8_t* data, CFIndex length,
+                                                 IOOptionBits options);
 void IOHIDEventAppendEvent(IOHIDEventRef parent, IOHIDEventRef child, IOOptionBits options);
 // Deep copy: fields, vendor data and children.
 IOHIDEventRef IOHIDEventCreateCopy(CFAllocatorRef allocator, IOHIDEventRef event);
