@@ -11,7 +11,7 @@ packages=(
   libgtest-dev libgmock-dev libbenchmark-dev
   libopenblas-dev libsqlite3-dev
   nlohmann-json3-dev libcli11-dev liblcms2-dev colord-data
-  libeigen3-dev libxml2-dev clang libclang-rt-14-dev
+  libeigen3-dev libxml2-dev clang libclang-rt-14-dev clang-format
 )
 
 missing=()
