@@ -13,6 +13,7 @@
 // cache file can be named with VANTISH_BENCH_CACHE).
 //
 // Run: bench_colour --benchmark_repetitions=9 --benchmark_report_aggregates_only=true
+// (VANTISH_BENCH_SIMD=baseline, avx2 or avx512 forces the vector level.)
 #include "colour/ColourCalculation.h"
 #include "colour/MatrixUtilities.h"
 #include "colour/SimdLevel.h"
@@ -271,4 +272,19 @@ BENCHMARK_CAPTURE(BM_Baseline, client, ClientLambda)->Apply(unit);
 
 } // namespace
 
-BENCHMARK_MAIN();
+int main(int argc, char** argv)
+{
+    // VANTISH_BENCH_SIMD=baseline|avx2|avx512 runs the kernels at that level
+    // (at most what the processor has), to compare the levels.
+    if (const char* level = std::getenv("VANTISH_BENCH_SIMD")) {
+        for (SimdLevel l : {SimdLevel::Baseline, SimdLevel::Avx2, SimdLevel::Avx512})
+            if (std::string(level) == simdLevelName(l))
+                forceSimdLevel(l);
+    }
+    benchmark::Initialize(&argc, argv);
+    if (benchmark::ReportUnrecognizedArguments(argc, argv))
+        return 1;
+    benchmark::RunSpecifiedBenchmarks();
+    benchmark::Shutdown();
+    return 0;
+}
