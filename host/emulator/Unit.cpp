@@ -6,6 +6,7 @@
 #include <VantishPlatform/HIDHost.h>
 #include <VantishPlatform/Paths.h>
 
+#include <algorithm>
 #include <cstdlib>
 #include <filesystem>
 #include <functional>
@@ -67,6 +68,14 @@ Unit::Unit(const DeviceDescription& description) : description_(description)
     createRegistry(description_);
 
     service_.reset(VPServiceCreate(description_.registryID));
+    VPServiceSetReceiveObserver(service_.get(), [received = received_](CFStringRef key, CFTypeRef) {
+        char text[256];
+        if (!CFStringGetCString(key, text, sizeof text, kCFStringEncodingUTF8))
+            return;
+        std::lock_guard lock(received->mutex);
+        if (std::find(received->keys.begin(), received->keys.end(), text) == received->keys.end())
+            received->keys.emplace_back(text);
+    });
     for (const auto& [page, usage] : description_.usages)
         VPServiceAddUsage(service_.get(), page, usage);
     setProperties(description_.serviceProperties, description_.folder(), "service.properties",
@@ -84,6 +93,12 @@ CFTypeRef Unit::copyDriverProperty(const char* key) const
 {
     const CFOwned<CFStringRef> cfKey(CFStringCreateWithCString(nullptr, key, kCFStringEncodingUTF8));
     return VPServiceCopyReceivedProperty(service_.get(), cfKey.get());
+}
+
+std::vector<std::string> Unit::driverPropertyKeys() const
+{
+    std::lock_guard lock(received_->mutex);
+    return received_->keys;
 }
 
 void mapDevicePaths(const std::string& bundleFolder, const std::string& stateFolder)

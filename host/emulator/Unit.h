@@ -9,7 +9,10 @@
 
 #include <IOKit/hid/IOHIDService.h>
 
+#include <memory>
+#include <mutex>
 #include <string>
+#include <vector>
 
 namespace host {
 
@@ -24,10 +27,18 @@ public:
 
     // What the plug-in handed the driver under `key` (retained), or null.
     CFTypeRef copyDriverProperty(const char* key) const;
+    // Every key the plug-in handed the driver a value for, in the order of the first.
+    std::vector<std::string> driverPropertyKeys() const;
 
 private:
+    struct ReceivedKeys {
+        std::mutex mutex;
+        std::vector<std::string> keys;
+    };
+
     DeviceDescription description_;
     CFOwned<IOHIDServiceRef> service_; // released too when the constructor fails after making it
+    std::shared_ptr<ReceivedKeys> received_ = std::make_shared<ReceivedKeys>(); // written on the setter's thread
 };
 
 // Maps the device's fixed paths: the system folder onto the bundle's parent,

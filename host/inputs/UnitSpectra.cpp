@@ -276,15 +276,6 @@ std::optional<std::vector<uint8_t>> registryData(const DeviceDescription& unit, 
     return std::vector<uint8_t>(begin, begin + CFDataGetLength(data));
 }
 
-uint32_t orientationOf(const DeviceDescription& unit)
-{
-    const auto bytes = registryData(unit, "IOHIDOrientationType");
-    if (!bytes || bytes->size() < 4)
-        return 1;
-    return uint32_t((*bytes)[0]) | uint32_t((*bytes)[1]) << 8 | uint32_t((*bytes)[2]) << 16 |
-           uint32_t((*bytes)[3]) << 24;
-}
-
 // The first entry of a decoded blob for `orientation`, or null.
 const Json* entryFor(const Json& fields, uint32_t orientation)
 {
@@ -322,7 +313,7 @@ UnitSpectra fromRegistry(const DeviceDescription& unit)
     if (!blob)
         fail(unit, "the service asks for registry calibration but no registry entry above it holds "
                    "\"alsCalibration\" data");
-    const uint32_t orientation = orientationOf(unit);
+    const uint32_t orientation = unitOrientation(unit);
     const std::string what = "\"alsCalibration\"";
     const Json record = decodeRecord(unit, *blob, recordcodec::Kind::AlsCalibration, what);
     const Json& fields = record["fields"];
@@ -372,6 +363,15 @@ bool serviceFlag(const DeviceDescription& unit, const char* key)
 }
 
 } // namespace
+
+uint32_t unitOrientation(const DeviceDescription& unit)
+{
+    const auto bytes = registryData(unit, "IOHIDOrientationType");
+    if (!bytes || bytes->size() < 4)
+        return 1;
+    return uint32_t((*bytes)[0]) | uint32_t((*bytes)[1]) << 8 | uint32_t((*bytes)[2]) << 16 |
+           uint32_t((*bytes)[3]) << 24;
+}
 
 UnitSpectra loadUnitSpectra(const DeviceDescription& unit)
 {

@@ -14,6 +14,7 @@
 #include "spectra/Catalogue.h"
 #include "spectra/Grid.h"
 
+#include <cstdint>
 #include <stdexcept>
 #include <string>
 #include <vector>
@@ -49,5 +50,9 @@ struct UnitSpectra {
 // record and no registry calibration, the default calibration forced, a
 // record the plug-in cannot use) or a record cannot be read or decoded.
 UnitSpectra loadUnitSpectra(const DeviceDescription& unit);
+
+// The unit's orientation as the plug-in reads it: the 32-bit little-endian
+// "IOHIDOrientationType" of the service's registry entry or its parents, else 1.
+uint32_t unitOrientation(const DeviceDescription& unit);
 
 } // namespace host

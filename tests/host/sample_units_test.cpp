@@ -12,8 +12,6 @@
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
 
-#include <VantishPlatform/DispatchControl.h>
-
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -154,7 +152,7 @@ TEST_P(SampleUnitBringUp, CalibratesCachesAndColours)
         host::PlugInSession session(bundle, unit);
         ASSERT_EQ(session.match(), 1000);
         session.open();
-        VPDispatchDrain();
+        session.waitForQueuedWork();
 
         EXPECT_TRUE(log.contains(u.recognised));
         EXPECT_TRUE(log.contains("Small DB has been created\n"));
@@ -190,7 +188,7 @@ TEST_P(SampleUnitBringUp, CalibratesCachesAndColours)
     host::PlugInSession session(bundle, unit);
     ASSERT_EQ(session.match(), 1000);
     session.open();
-    VPDispatchDrain();
+    session.waitForQueuedWork();
     EXPECT_TRUE(log.contains("Matching cached DB found"));
     EXPECT_FALSE(log.contains("Small DB has been created\n"));
     EXPECT_TRUE(vt::plugInColour(session, countsUnder(sensor, spectra::cieD65()), 300.0));

@@ -18,8 +18,6 @@
 #include "spectra/SensorModel.h"
 #include "spectra/TestLights.h"
 
-#include <VantishPlatform/DispatchControl.h>
-
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -136,7 +134,7 @@ TEST(SixChannelUnit, PlugInGivesTheFitOfItsFiveColourChannels)
     host::PlugInSession session(bundle, unit);
     ASSERT_EQ(session.match(), 1000);
     session.open();
-    VPDispatchDrain();
+    session.waitForQueuedWork();
 
     for (const spectra::Source& light : spectra::testLights()) {
         SCOPED_TRACE(light.name);

@@ -10,8 +10,6 @@
 #include "spectra/Colorimetry.h"
 #include "spectra/SensorModel.h"
 
-#include <VantishPlatform/DispatchControl.h>
-
 #include <gtest/gtest.h>
 
 #include <algorithm>
@@ -104,7 +102,7 @@ std::vector<spectra::Xy> plugInChromaticities(const host::DeviceDescription& des
     host::PlugInSession session(bundle, unit);
     EXPECT_EQ(session.match(), 1000);
     session.open();
-    VPDispatchDrain();
+    session.waitForQueuedWork();
 
     std::vector<spectra::Xy> out;
     for (const host::SensorReading& reading : readings) {
