@@ -8,9 +8,9 @@
 #        scripts/transcripts.sh check    compares with them (exit 1 on a difference)
 # The build must exist (scripts/setup.sh); VANTISH_BUILD_DIR names another one.
 #
-# Machine paths are blanked. The bring-up queued by `open` may start before
-# `open` returns, so where the log splits between the two steps varies from
-# run to run; the step headers are dropped and the log kept in its order.
+# Machine paths are blanked. `open` holds the bring-up it queues until the
+# plug-in's open has returned, so each log line stands under the step that
+# logged it and the text is the same on every run.
 set -euo pipefail
 here=$(cd "$(dirname "$0")/.." && pwd)
 build=${VANTISH_BUILD_DIR:-$here/build}
@@ -38,8 +38,7 @@ transcript() { # unit
 }
 
 blank() {
-    sed -e "s#$build#<build>#g" -e "s#$work#<work>#g" -e "s#$here#<source>#g" |
-        grep -v -E '^(open|bring-up)( |$)'
+    sed -e "s#$build#<build>#g" -e "s#$work#<work>#g" -e "s#$here#<source>#g"
 }
 
 status=0

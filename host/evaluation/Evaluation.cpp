@@ -15,6 +15,7 @@ Estimate assess(const std::optional<spectra::Xyz>& xyz, const LightResult& truth
     e.valid = true;
     e.xy = spectra::chromaticity(*xyz);
     e.cct = spectra::correlatedColourTemperature(e.xy);
+    e.duv = spectra::distanceFromLocus(e.xy);
     e.deltaUv = spectra::deltaUvPrime(spectra::uvPrime(e.xy), spectra::uvPrime(truth.trueXy));
     if (e.cct && truth.trueCct)
         e.deltaCct = *e.cct - *truth.trueCct;
@@ -63,6 +64,7 @@ std::vector<LightResult> evaluateLights(const std::vector<spectra::Source>& ligh
         r.name = light.name;
         r.trueXy = spectra::chromaticity(spectra::tristimulus(light.spectrum));
         r.trueCct = spectra::correlatedColourTemperature(r.trueXy);
+        r.trueDuv = spectra::distanceFromLocus(r.trueXy);
         r.reading = synthesiseReading(unit, light.spectrum, lux);
         r.plugIn = assess(plugIn(r.reading), r);
         r.baseline = assess(baseline(r.reading), r);

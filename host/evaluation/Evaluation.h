@@ -21,6 +21,7 @@ struct Estimate {
     bool valid = false; // the estimator gave a colour
     spectra::Xy xy;
     std::optional<double> cct;
+    std::optional<double> duv;      // signed CIE 1960 uv distance from the Planckian locus, where there is a CCT
     double deltaUv = 0.0;           // Δu′v′ from the true chromaticity
     std::optional<double> deltaCct; // estimated − true CCT, where both exist
 };
@@ -29,6 +30,7 @@ struct LightResult {
     std::string name;
     spectra::Xy trueXy;
     std::optional<double> trueCct;
+    std::optional<double> trueDuv;
     SensorReading reading;
     Estimate plugIn;
     Estimate baseline;

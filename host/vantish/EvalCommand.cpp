@@ -12,6 +12,8 @@
 #include "host/vantish/ReadingFilter.h"
 #include "spectra/TestLights.h"
 
+#include <nlohmann/json.hpp>
+
 #include <cstdio>
 #include <filesystem>
 #include <fstream>
@@ -38,25 +40,70 @@ std::string cctText(const std::optional<double>& k, bool sign = false)
     return text;
 }
 
+std::string duvText(const std::optional<double>& duv)
+{
+    if (!duv)
+        return "-";
+    char text[32];
+    std::snprintf(text, sizeof text, "%+.4f", *duv);
+    return text;
+}
+
 void printEstimate(const host::Estimate& e)
 {
     if (!e.valid) {
-        std::printf("  %-34s", "no colour");
+        std::printf("  %-36s", "no colour");
         return;
     }
-    std::printf("  %.4f %.4f %.4f %7s", e.xy.x, e.xy.y, e.deltaUv, cctText(e.deltaCct, true).c_str());
+    std::printf("  %.4f %.4f %7s %.4f %7s", e.xy.x, e.xy.y, duvText(e.duv).c_str(), e.deltaUv,
+                cctText(e.deltaCct, true).c_str());
 }
 
 void printTable(const std::vector<host::LightResult>& results)
 {
-    std::printf("%-38s  %-20s  %-34s  %s\n", "", "true", "plug-in", "global matrix");
-    std::printf("%-38s  x      y        CCT  x      y      Δu′v′     ΔCCT  x      y      Δu′v′     ΔCCT\n", "light");
+    std::printf("%-38s  %-28s  %-36s  %s\n", "", "true", "plug-in", "global matrix");
+    std::printf("%-38s  x      y         CCT     Duv  x      y          Duv  Δu′v′    ΔCCT"
+                "  x      y          Duv  Δu′v′    ΔCCT\n",
+                "light");
     for (const host::LightResult& r : results) {
-        std::printf("%-38s  %.4f %.4f %6s", r.name.c_str(), r.trueXy.x, r.trueXy.y, cctText(r.trueCct).c_str());
+        std::printf("%-38s  %.4f %.4f %6s %7s", r.name.c_str(), r.trueXy.x, r.trueXy.y, cctText(r.trueCct).c_str(),
+                    duvText(r.trueDuv).c_str());
         printEstimate(r.plugIn);
         printEstimate(r.baseline);
         std::printf("\n");
     }
+}
+
+nlohmann::json optionalJson(const std::optional<double>& value)
+{
+    return value ? nlohmann::json(*value) : nlohmann::json(nullptr);
+}
+
+nlohmann::json chromaticityJson(const spectra::Xy& xy, const std::optional<double>& cct,
+                                const std::optional<double>& duv)
+{
+    const spectra::Uv uv = spectra::uvPrime(xy);
+    return {{"x", xy.x},
+            {"y", xy.y},
+            {"u_prime", uv.u},
+            {"v_prime", uv.v},
+            {"cct", optionalJson(cct)},
+            {"duv", optionalJson(duv)}};
+}
+
+nlohmann::json estimateJson(const host::Estimate& e)
+{
+    if (!e.valid)
+        return nullptr;
+    nlohmann::json j = chromaticityJson(e.xy, e.cct, e.duv);
+    j["delta_uv"] = e.deltaUv;
+    j["delta_cct"] = optionalJson(e.deltaCct);
+    return j;
+}
+
+nlohmann::json summaryJson(const host::ErrorSummary& s)
+{
+    return {{"count", s.count}, {"missing", s.missing}, {"median", s.median}, {"p95", s.p95}, {"max", s.max}};
 }
 
 void printSummary(const std::vector<host::LightResult>& results)
@@ -125,13 +172,17 @@ int runEvaluation(const CommonOptions& common, const EvalOptions& options)
         if (!applyAssignments(*opened, options.sets))
             return 2;
 
-        std::printf("Unit       %s%s%s\n", description.name.c_str(), description.summary.empty() ? "" : " - ",
-                    description.summary.c_str());
-        std::printf("Spectra    %s\n", unit.origin.c_str());
-        std::printf("Reference  %s (%zu sources) for the plug-in and the global matrix\n",
-                    referenceFileName(unit.referenceSet), spectra::referenceSources(unit.referenceSet).size());
-        std::printf("Lights     %zu: %s, at %g lux\n\n", lights.size(), lightsName.c_str(), options.lux);
-        std::fflush(stdout);
+        const bool json = options.format == "json";
+        const size_t referenceCount = spectra::referenceSources(unit.referenceSet).size();
+        if (!json) {
+            std::printf("Unit       %s%s%s\n", description.name.c_str(), description.summary.empty() ? "" : " - ",
+                        description.summary.c_str());
+            std::printf("Spectra    %s\n", unit.origin.c_str());
+            std::printf("Reference  %s (%zu sources) for the plug-in and the global matrix\n",
+                        referenceFileName(unit.referenceSet), referenceCount);
+            std::printf("Lights     %zu: %s, at %g lux\n\n", lights.size(), lightsName.c_str(), options.lux);
+            std::fflush(stdout);
+        }
 
         std::vector<host::LightResult> results;
         {
@@ -141,8 +192,25 @@ int runEvaluation(const CommonOptions& common, const EvalOptions& options)
                 [&](const host::SensorReading& r) { return baseline.estimate(r); },
                 [&](size_t done) { progress.update(done); });
         }
-        printTable(results);
-        printSummary(results);
+        const host::ErrorSummary plugInSummary = host::summarise(results, &host::LightResult::plugIn);
+        nlohmann::json out;
+        if (json) {
+            out = {{"unit", {{"name", description.name}, {"summary", description.summary}, {"file", options.device}}},
+                   {"spectra", unit.origin},
+                   {"reference", {{"file", referenceFileName(unit.referenceSet)}, {"sources", referenceCount}}},
+                   {"lights", {{"description", lightsName}, {"count", lights.size()}, {"lux", options.lux}}}};
+            nlohmann::json& rows = out["results"] = nlohmann::json::array();
+            for (const host::LightResult& r : results)
+                rows.push_back({{"light", r.name},
+                                {"true", chromaticityJson(r.trueXy, r.trueCct, r.trueDuv)},
+                                {"plug_in", estimateJson(r.plugIn)},
+                                {"global_matrix", estimateJson(r.baseline)}});
+            out["summary"] = {{"plug_in", summaryJson(plugInSummary)},
+                              {"global_matrix", summaryJson(host::summarise(results, &host::LightResult::baseline))}};
+        } else {
+            printTable(results);
+            printSummary(results);
+        }
 
         if (report.is_open()) {
             const host::ReportContext context{description.name,
@@ -156,9 +224,14 @@ int runEvaluation(const CommonOptions& common, const EvalOptions& options)
             report.close();
             if (!report)
                 throw std::runtime_error(options.report + ": writing the report failed");
-            std::printf("\nReport     %s\n", std::filesystem::absolute(options.report).c_str());
+            if (json)
+                out["report"] = std::filesystem::absolute(options.report).string();
+            else
+                std::printf("\nReport     %s\n", std::filesystem::absolute(options.report).c_str());
         }
-        if (host::summarise(results, &host::LightResult::plugIn).count == 0) {
+        if (json)
+            std::printf("%s\n", out.dump(2).c_str());
+        if (plugInSummary.count == 0) {
             std::cerr << "vantish eval: the plug-in gave no colour for any light; its calibration did not come up "
                          "on this unit (see vantish open "
                       << options.device << ")\n";
@@ -183,12 +256,17 @@ Runner addEvalCommand(CLI::App& app, const CommonOptions& common)
     app.add_option("--lux", options->lux, "Illuminance of every reading")
         ->check(CLI::PositiveNumber)
         ->capture_default_str();
+    app.add_option("--format", options->format,
+                   "Output: text (a table and a summary) or json (one object with every value; see docs/usage.md)")
+        ->check(CLI::IsMember({"text", "json"}))
+        ->capture_default_str();
     app.add_option("--set", options->sets,
                    "Set a client property before the first reading, KEY=VALUE with VALUE in JSON, as for\n"
                    "vantish run (ColorAlgoLambda=0.01 evaluates the fit with a client's lambda)");
     app.footer("For each light: the true chromaticity and CCT (CIE 1931 2°), the plug-in's estimate through its\n"
                "filter, and the estimate of one global least-squares channel-to-XYZ matrix fitted over the unit's\n"
-               "reference sources, both from the same noise-free reading; errors as Δu′v′ and ΔCCT; summary:\n"
+               "reference sources, both from the same noise-free reading; Duv (signed CIE 1960 uv distance from\n"
+               "the Planckian locus); errors as Δu′v′ and ΔCCT; summary:\n"
                "median, 95th percentile and maximum Δu′v′. Exit status 1 when the plug-in gave no colour at\n"
                "all, 2 when nothing could be evaluated.");
     return [&common, options] { return runEvaluation(common, *options); };

@@ -14,6 +14,7 @@ struct EvalOptions {
     std::string report;               // the HTML report to write; empty: none
     double lux = 100.0;
     std::vector<std::string> sets; // client properties set before the first reading
+    std::string format = "text";   // text (table and summary) or json
 };
 
 // Prints the table and the summary, writes the report. 0 when the lights were

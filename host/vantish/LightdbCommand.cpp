@@ -1,7 +1,9 @@
-// vantish lightdb info FILE: what a reference light-source database or a
-// per-chip cache holds, read without changing it.
+// vantish lightdb info|export FILE: what a reference light-source database or
+// a per-chip cache holds, read without changing it; its values as CSV.
 #include "host/vantish/Commands.h"
 
+#include "host/vantish/DatabaseCsv.h"
+#include "host/vantish/FileOutput.h"
 #include "lightdb/Inspect.h"
 
 #include <sqlite3.h>
@@ -16,6 +18,7 @@ namespace {
 
 struct LightdbOptions {
     std::string file;
+    std::string output; // export: the CSV file; empty or "-": standard output
 };
 
 // "S0 … S400" for a run of sample columns, else the names as they are.
@@ -88,6 +91,28 @@ int runInfo(const LightdbOptions& o)
     return 0;
 }
 
+int runExport(const LightdbOptions& o)
+{
+    std::string csv;
+    try {
+        csv = databaseCsv(readDatabaseTable(o.file), o.file, {});
+    } catch (const std::exception& e) {
+        std::cerr << "vantish lightdb export: " << o.file << ": " << e.what() << "\n";
+        return 2;
+    }
+    if (o.output.empty() || o.output == "-") {
+        std::cout << csv;
+        return 0;
+    }
+    try {
+        writeWhole(o.output, csv);
+    } catch (const std::exception& e) {
+        std::cerr << "vantish lightdb export: " << e.what() << "\n";
+        return 2;
+    }
+    return 0;
+}
+
 } // namespace
 
 Runner addLightdbCommand(CLI::App& app, const CommonOptions&)
@@ -101,7 +126,24 @@ Runner addLightdbCommand(CLI::App& app, const CommonOptions&)
         ->required();
     info->footer("Families are the name prefixes of the sources (led, ledr, daylight, …) from the file's Names\n"
                  "table; the reference databases built by make_reference_db carry one.");
-    return [o] { return runInfo(*o); };
+
+    auto e = std::make_shared<LightdbOptions>();
+    CLI::App* exportCommand =
+        app.add_subcommand("export", "Write a light database file as CSV: source, X, Y, Z, then its columns");
+    exportCommand
+        ->add_option("file", e->file,
+                     "A reference database (bzlight.sqlite, bzlight-02.sqlite) or a per-chip cache "
+                     "(bzrgbc_<orientation>.sqlite)")
+        ->required();
+    exportCommand->add_option("-o,--output", e->output,
+                              "Write the CSV here (whole, or not at all) instead of standard output");
+    exportCommand->footer(
+        "'#' lines name the kind and give the Info row as stored; then the header and one line per source.\n"
+        "Reference files: source is the ID, then X, Y, Z and the sample columns S0 … S400 (300–1100 nm in\n"
+        "2 nm steps). Per-chip caches: source is the row, X, Y, Z from XX and the channel responses of RR\n"
+        "(CH0 …, or R, G, B, C), un-normalised as cached. Values are written exactly as the file stores them\n"
+        "(the shortest text that reads back to the same double).");
+    return [o, e, exportCommand] { return exportCommand->parsed() ? runExport(*e) : runInfo(*o); };
 }
 
 } // namespace vantish

@@ -36,15 +36,20 @@ std::unique_ptr<OpenedUnit> openUnit(const CommonOptions& common, const std::str
     return opened;
 }
 
-void applyLogOption(const CommonOptions& common)
+VPLogLevel logLevelOption(const CommonOptions& common, VPLogLevel fallback)
 {
     static const std::map<std::string, VPLogLevel> levels = {{"off", VPLogLevel::Off},
                                                              {"error", VPLogLevel::Error},
                                                              {"default", VPLogLevel::Default},
                                                              {"info", VPLogLevel::Info},
                                                              {"debug", VPLogLevel::Debug}};
+    return common.logLevel.empty() ? fallback : levels.at(common.logLevel);
+}
+
+void applyLogOption(const CommonOptions& common)
+{
     VPLogSetEcho(true);
-    VPLogSetLevel(common.logLevel.empty() ? VPLogLevel::Error : levels.at(common.logLevel));
+    VPLogSetLevel(logLevelOption(common, VPLogLevel::Error));
 }
 
 CFTypeRef clientPropertyValue(const nlohmann::json& value)

@@ -8,6 +8,8 @@
 #include "host/emulator/PlugInSession.h"
 #include "host/emulator/Unit.h"
 
+#include <VantishPlatform/LogControl.h>
+
 #include <memory>
 #include <string>
 
@@ -32,6 +34,8 @@ std::unique_ptr<OpenedUnit> openUnit(const CommonOptions& common, const std::str
 // Applies the --log option: the plug-in's log on stderr from that level on
 // (errors only when not given).
 void applyLogOption(const CommonOptions& common);
+// The level the --log option names, or `fallback` when it was not given.
+VPLogLevel logLevelOption(const CommonOptions& common, VPLogLevel fallback);
 
 // A CF value (caller releases) for a client property given in JSON.
 CFTypeRef clientPropertyValue(const nlohmann::json& value);

@@ -31,7 +31,7 @@ public:
     Printer(std::ostream& out, bool json) : out_(out), json_(json)
     {
         if (!json_)
-            out_ << "index,lux,X,Y,Z,x,y,u_prime,v_prime,cct,colorSpace,spike\n";
+            out_ << "index,lux,X,Y,Z,x,y,u_prime,v_prime,cct,colorSpace,spike,duv\n";
     }
     void print(const ClientColour& r)
     {
@@ -41,6 +41,9 @@ public:
         const auto cctEstimate = hasColour ? spectra::correlatedColourTemperature(xy) : std::nullopt;
         const bool hasCct = cctEstimate.has_value();
         const double cct = cctEstimate.value_or(0.0);
+        const auto duvEstimate = hasColour ? spectra::distanceFromLocus(xy) : std::nullopt;
+        const bool hasDuv = duvEstimate.has_value();
+        const double duv = duvEstimate.value_or(0.0);
         std::ostringstream line;
         line << std::setprecision(6);
         if (json_) {
@@ -53,6 +56,7 @@ public:
                 j["v_prime"] = uv.v;
             }
             j["cct"] = hasCct ? nlohmann::json(cct) : nlohmann::json(nullptr);
+            j["duv"] = hasDuv ? nlohmann::json(duv) : nlohmann::json(nullptr);
             out_ << j.dump() << "\n";
             return;
         }
@@ -63,7 +67,9 @@ public:
             line << ",,,,";
         if (hasCct)
             line << std::fixed << std::setprecision(0) << cct;
-        line << ',' << r.colorSpace << ',' << (r.spike ? 1 : 0);
+        line << ',' << r.colorSpace << ',' << (r.spike ? 1 : 0) << ',';
+        if (hasDuv)
+            line << std::fixed << std::setprecision(4) << duv;
         out_ << line.str() << "\n";
     }
 
@@ -187,7 +193,8 @@ Runner addRunCommand(CLI::App& app, const CommonOptions& common)
                "Absent fields take defaults (see docs/usage.md). Lines '!set KEY=VALUE' and '!copy' (CSV) or\n"
                "{\"set\": {KEY: VALUE}} and {\"copy\": true} (JSON lines) set client properties and copy the\n"
                "current event. Output: index, lux, X, Y, Z as clients receive them, chromaticity x, y, u', v',\n"
-               "correlated colour temperature, colour space, and whether the sample was a light spike.");
+               "correlated colour temperature, colour space, whether the sample was a light spike, and Duv\n"
+               "(signed CIE 1960 uv distance from the Planckian locus, positive above it).");
     return [&common, options] { return runEvents(common, *options); };
 }
 

@@ -3,6 +3,7 @@
 // answered with one clear error naming what and where, failing only when
 // nothing could be done.
 #include "ReportXml.h"
+#include "VantishCommand.h"
 #include "common/TestSupport.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/TestLights.h"
@@ -19,76 +20,7 @@
 
 namespace {
 
-namespace fs = std::filesystem;
-
-struct Outcome {
-    int status = -1;
-    std::string out;
-    std::string err;
-};
-
-std::string slurp(const fs::path& path)
-{
-    std::ifstream in(path);
-    std::ostringstream text;
-    text << in.rdbuf();
-    return text.str();
-}
-
-std::string quoted(const std::string& s) { return "'" + s + "'"; }
-
-std::string device(const std::string& unit)
-{
-    return quoted((fs::path(vt::sourceDir()) / "data" / "devices" / unit / "device.json").string());
-}
-
-// The command in a fresh working folder with its own state folder.
-class VantishCommand : public testing::Test {
-protected:
-    Outcome run(const std::string& arguments)
-    {
-        std::string command = "cd " + quoted(dir_.str()) + " && " + quoted(VANTISH_COMMAND) + " --state " +
-                              quoted((dir_.path() / "state").string()) + " " + arguments;
-        command += " > out.txt 2> err.txt";
-        Outcome o;
-        const int raw = std::system(command.c_str());
-        o.status = WIFEXITED(raw) ? WEXITSTATUS(raw) : -1;
-        o.out = slurp(dir_.path() / "out.txt");
-        o.err = slurp(dir_.path() / "err.txt");
-        return o;
-    }
-    fs::path file(const std::string& name, const std::string& text)
-    {
-        std::ofstream(dir_.path() / name) << text;
-        return dir_.path() / name;
-    }
-    fs::path path(const std::string& name) const { return dir_.path() / name; }
-
-private:
-    vt::TempDir dir_;
-};
-
-int lineCount(const std::string& text) { return int(std::count(text.begin(), text.end(), '\n')); }
-
-// The numbers after `label` on the first output line that starts with it
-// (after indentation), as in "  plug-in   0.0002   0.0025   0.0067".
-std::vector<double> rowNumbers(const std::string& out, const std::string& label)
-{
-    std::istringstream lines(out);
-    for (std::string line; std::getline(lines, line);) {
-        const size_t start = line.find_first_not_of(' ');
-        const size_t end = start + label.size();
-        if (start == std::string::npos || line.compare(start, label.size(), label) != 0 || end >= line.size() ||
-            line[end] != ' ')
-            continue;
-        std::istringstream fields(line.substr(end));
-        std::vector<double> numbers;
-        for (double x; fields >> x;)
-            numbers.push_back(x);
-        return numbers;
-    }
-    return {};
-}
+using namespace vt::command;
 
 // The median Δu′v′ of one summary row.
 double summaryMedian(const std::string& out, const std::string& label)
@@ -155,10 +87,10 @@ TEST_F(VantishCommand, SynthIntoRunReturnsTheLightWithinTheEvaluatedAccuracy)
     // The same light in the evaluation: its row's Δu′v′, and the unit's maximum.
     const Outcome eval = run("eval " + device("xwcl-14"));
     ASSERT_EQ(eval.status, 0) << eval.err;
-    // The light's row: true x, y, CCT, estimated x, y, then Δu′v′.
+    // The light's row: true x, y, CCT, Duv, estimated x, y, Duv, then Δu′v′.
     const auto row = rowNumbers(eval.out, light);
-    ASSERT_GE(row.size(), 6u) << eval.out;
-    const double evaluated = row[5];
+    ASSERT_GE(row.size(), 8u) << eval.out;
+    const double evaluated = row[7];
     const auto summary = rowNumbers(eval.out, "plug-in");
     ASSERT_EQ(summary.size(), 3u) << eval.out;
     const double worst = summary[2];
@@ -264,6 +196,23 @@ TEST_F(VantishCommand, BadInputIsNamedAndOnlyNothingDoneFails)
          {},
          0},
         {"lightdb info notes.sqlite", 2, "vantish lightdb info: notes.sqlite: cannot read (file is not a database)\n"},
+        {"lightdb export notes.sqlite",
+         2,
+         "vantish lightdb export: notes.sqlite: cannot read (file is not a database)\n",
+         Match::Exact,
+         {},
+         0},
+        {"lightdb export nowhere.sqlite", 2,
+         "vantish lightdb export: nowhere.sqlite: cannot read (unable to open database file)\n"},
+        {"lightdb export " + quoted(vt::bundleDir() + "/bzlight.sqlite") + " -o blocked/ref.csv", 2,
+         "vantish lightdb export: blocked/ref.csv: cannot write (Not a directory)\n"},
+        // A folder that cannot be made stops open before the work.
+        {"open " + xwca + " --save blocked/saved",
+         2,
+         "vantish: blocked/saved: cannot create the folder (Not a directory)\n",
+         Match::Exact,
+         {},
+         0},
     };
     for (const Case& c : cases) {
         SCOPED_TRACE(c.args);
@@ -303,6 +252,16 @@ TEST_F(VantishCommand, OneHelpTreeDocumentsEverySubcommand)
     const Outcome synth = run("synth --help");
     EXPECT_NE(synth.out.find("test-incandescent-dimmed-2250K"), std::string::npos) << synth.out;
     EXPECT_NE(run("lightdb info --help").out.find("Names"), std::string::npos);
+
+    // docs/usage.md shows this help (scripts/usage_help.sh record writes it there).
+    const std::string usage = slurp(fs::path(vt::sourceDir()) / "docs" / "usage.md");
+    const std::string begin = "<!-- begin vantish --help-all -->\n```text\n",
+                      end = "```\n<!-- end vantish --help-all -->";
+    const size_t from = usage.find(begin), to = usage.find(end);
+    ASSERT_TRUE(from != std::string::npos && to != std::string::npos) << "docs/usage.md has no help block";
+    const Outcome documented = run("--help-all", "VANTISH_BUNDLE=build/Vantish.plugin XDG_STATE_HOME='~/.local/state'");
+    EXPECT_EQ(usage.substr(from + begin.size(), to - from - begin.size()), documented.out)
+        << "docs/usage.md differs from vantish --help-all: run scripts/usage_help.sh record";
 }
 
 } // namespace
