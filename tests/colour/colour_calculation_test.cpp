@@ -340,7 +340,6 @@ TEST(ColourCalculation, NormalisedModeLogsItsSteps)
 
 TEST(EuklidNorm, ScalesEachSampleToUnitLength)
 {
-    FitSettings fit;
     vt::LogCapture log;
     float v[2] = {3.0f, 4.0f};
     normalizedByEuklidNorm(v, 1, 2);
@@ -370,7 +369,6 @@ TEST(EuklidNorm, ScalesEachSampleToUnitLength)
 
 TEST(StandardDeviation, PopulationFormPerRow)
 {
-    FitSettings fit;
     vt::LogCapture log;
     float rows[8] = {1, 2, 3, 4, 7, 7, 7, 7};
     float out[2] = {-1.0f, -1.0f};
@@ -390,7 +388,6 @@ TEST(StandardDeviation, PopulationFormPerRow)
 
 TEST(MatrixProduct, RowMajorWithSizeCheck)
 {
-    FitSettings fit;
     float A[12] = {1, 2, 3, 4, 0, 1, 0, 1, -1, 0.5f, 2, 0};
     float B[5] = {1, 2, 3, 4, 5};
     float C[3] = {9, 9, 9};

@@ -97,7 +97,7 @@ TEST_F(DispatchTest, HigherPriorityFirstFifoWithin)
                                       {DISPATCH_QUEUE_PRIORITY_DEFAULT, "default2"},
                                       {DISPATCH_QUEUE_PRIORITY_HIGH, "high2"},
                                       {DISPATCH_QUEUE_PRIORITY_LOW, "low2"}})
-            dispatch_async(queue(priority), [&trace, name] { trace.add(name); });
+            dispatch_async(queue(priority), [&trace, label = name] { trace.add(label); });
         release.add();
         ASSERT_TRUE(trace.waitFor(7));
     }
