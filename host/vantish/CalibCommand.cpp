@@ -4,6 +4,8 @@
 
 #include "host/recordcodec/RecordCodec.h"
 
+#include <CLI/CLI.hpp>
+
 #include <fstream>
 #include <iostream>
 #include <iterator>

@@ -2,10 +2,13 @@
 // app and returns the exit code when it runs.
 #pragma once
 
-#include <CLI/CLI.hpp>
-
 #include <functional>
 #include <string>
+
+// The CLI11 parser is included only by the files that register options.
+namespace CLI {
+class App;
+}
 
 namespace vantish {
 

@@ -3,6 +3,8 @@
 #include "host/vantish/Commands.h"
 #include "host/vantish/EvalCommand.h"
 
+#include <CLI/CLI.hpp>
+
 #include <memory>
 
 namespace vantish {

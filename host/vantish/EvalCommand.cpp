@@ -12,6 +12,7 @@
 #include "host/vantish/ReadingFilter.h"
 #include "spectra/TestLights.h"
 
+#include <CLI/CLI.hpp>
 #include <nlohmann/json.hpp>
 
 #include <cstdio>

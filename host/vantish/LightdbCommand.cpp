@@ -6,6 +6,8 @@
 #include "host/vantish/FileOutput.h"
 #include "lightdb/Inspect.h"
 
+#include <CLI/CLI.hpp>
+
 #include <sqlite3.h>
 
 #include <cstdio>

@@ -16,6 +16,8 @@
 #include "lightdb/LDBM.h"
 #include "support/CFOwned.h"
 
+#include <CLI/CLI.hpp>
+
 #include <VantishPlatform/LogControl.h>
 #include <VantishPlatform/Paths.h>
 

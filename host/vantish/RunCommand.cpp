@@ -9,6 +9,8 @@
 #include "spectra/Colorimetry.h"
 #include "support/CFOwned.h"
 
+#include <CLI/CLI.hpp>
+
 #include <fstream>
 #include <iomanip>
 #include <iostream>

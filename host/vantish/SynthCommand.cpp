@@ -10,6 +10,8 @@
 #include "spectra/Colorimetry.h"
 #include "spectra/TestLights.h"
 
+#include <CLI/CLI.hpp>
+
 #include <cstdio>
 #include <iostream>
 

@@ -5,6 +5,8 @@
 #include "host/emulator/Bundle.h"
 #include "host/emulator/Unit.h"
 
+#include <CLI/CLI.hpp>
+
 #include <VantishPlatform/LogControl.h>
 
 #include <iostream>
