@@ -17,8 +17,7 @@
 
 #include "spectra/Grid.h"
 #include "spectra/SensorModel.h"
-
-#include <CLI/CLI.hpp>
+#include "tools/ToolArguments.h"
 
 #include <algorithm>
 #include <cmath>
@@ -164,12 +163,14 @@ std::string readFile(const std::filesystem::path& path)
 
 int main(int argc, char** argv)
 {
-    CLI::App app{"Writes the model colour sensors as CSV files"};
     std::string folder;
     bool check = false;
-    app.add_option("folder", folder, "Folder receiving (or, with --check, holding) the sensor files")->required();
-    app.add_flag("--check", check, "Compare the files in the folder with what would be written");
-    CLI11_PARSE(app, argc, argv);
+    if (const auto stop = parseToolArguments(argc, argv,
+                                             {"Writes the model colour sensors as CSV files",
+                                              "Folder receiving (or, with --check, holding) the sensor files", true,
+                                              "--check", "Compare the files in the folder with what would be written"},
+                                             folder, check))
+        return *stop;
 
     const std::filesystem::path dir(folder);
     int differing = 0;

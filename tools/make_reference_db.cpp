@@ -8,8 +8,7 @@
 #include "spectra/Catalogue.h"
 #include "spectra/Colorimetry.h"
 #include "spectra/ReferenceDatabase.h"
-
-#include <CLI/CLI.hpp>
+#include "tools/ToolArguments.h"
 
 #include <cstdio>
 #include <exception>
@@ -52,12 +51,14 @@ void write(const std::filesystem::path& folder)
 
 int main(int argc, char** argv)
 {
-    CLI::App app{"Writes the reference light-source databases"};
     std::string folder;
     bool listOnly = false;
-    app.add_option("folder", folder, "Folder that receives bzlight.sqlite and bzlight-02.sqlite");
-    app.add_flag("--list", listOnly, "List the sources of both files instead of writing them");
-    CLI11_PARSE(app, argc, argv);
+    if (const auto stop = parseToolArguments(argc, argv,
+                                             {"Writes the reference light-source databases",
+                                              "Folder that receives bzlight.sqlite and bzlight-02.sqlite", false,
+                                              "--list", "List the sources of both files instead of writing them"},
+                                             folder, listOnly))
+        return *stop;
 
     try {
         if (listOnly) {

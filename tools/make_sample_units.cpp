@@ -14,8 +14,7 @@
 
 #include "host/recordcodec/RecordCodec.h"
 #include "spectra/SensorModel.h"
-
-#include <CLI/CLI.hpp>
+#include "tools/ToolArguments.h"
 
 #include <algorithm>
 #include <cmath>
@@ -555,12 +554,14 @@ void writeFile(const fs::path& path, const std::string& content)
 
 int main(int argc, char** argv)
 {
-    CLI::App app{"Writes the calibration records of the sample units"};
     std::string folder;
     bool check = false;
-    app.add_option("folder", folder, "The data folder (holding sensors/ and devices/)")->required();
-    app.add_flag("--check", check, "Compare the stored records with what would be written");
-    CLI11_PARSE(app, argc, argv);
+    if (const auto stop = parseToolArguments(argc, argv,
+                                             {"Writes the calibration records of the sample units",
+                                              "The data folder (holding sensors/ and devices/)", true, "--check",
+                                              "Compare the stored records with what would be written"},
+                                             folder, check))
+        return *stop;
 
     try {
         const fs::path data(folder);
