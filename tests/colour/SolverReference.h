@@ -55,67 +55,31 @@ inline Problem randomProblem(int N, int M, unsigned seed, Weights kind = Weights
     return p;
 }
 
-using RowMajor = Eigen::Matrix<float, Eigen::Dynamic, Eigen::Dynamic, Eigen::RowMajor>;
+// Independent double-precision answers (Eigen). They are compiled once, in
+// SolverReference.cpp: Eigen's decompositions take most of the build time of
+// the colour tests when every test file instantiates them.
 
-inline Eigen::MatrixXd responses(const Problem& p)
-{
-    return Eigen::Map<const RowMajor>(p.R.data(), p.M, p.N).cast<double>();
-}
-
-inline Eigen::MatrixXd targets(const Problem& p)
-{
-    return Eigen::Map<const RowMajor>(p.T.data(), 3, p.N).transpose().cast<double>();
-}
-
-inline Eigen::VectorXd weights(const Problem& p)
-{
-    return Eigen::Map<const Eigen::VectorXf>(p.w.data(), p.N).cast<double>();
-}
+// The problem in double precision: R (M x N), T^T (N x 3) and w (N).
+Eigen::MatrixXd responses(const Problem& p);
+Eigen::MatrixXd targets(const Problem& p);
+Eigen::VectorXd weights(const Problem& p);
 
 // (R W R^T + lambda I)^-1 R W T^T, M x 3.
-inline Eigen::MatrixXd closedForm(const Problem& p, double lambda)
-{
-    Eigen::MatrixXd R = responses(p);
-    Eigen::MatrixXd RW = R * weights(p).asDiagonal();
-    Eigen::MatrixXd G = RW * R.transpose() + lambda * Eigen::MatrixXd::Identity(p.M, p.M);
-    return G.ldlt().solve(RW * targets(p));
-}
+Eigen::MatrixXd closedForm(const Problem& p, double lambda);
 
 // The same by a QR factorisation of the stacked system [sqrt(W) R^T; sqrt(lambda) I],
 // which stays accurate where the normal equations lose digits (weights spanning
 // many orders of magnitude, nearly parallel samples).
-inline Eigen::MatrixXd closedFormQR(const Problem& p, double lambda)
-{
-    Eigen::VectorXd s = weights(p).cwiseSqrt();
-    Eigen::MatrixXd A(p.N + p.M, p.M), B(p.N + p.M, 3);
-    A.topRows(p.N) = s.asDiagonal() * responses(p).transpose();
-    A.bottomRows(p.M) = std::sqrt(lambda) * Eigen::MatrixXd::Identity(p.M, p.M);
-    B.topRows(p.N) = s.asDiagonal() * targets(p);
-    B.bottomRows(p.M).setZero();
-    return A.colPivHouseholderQr().solve(B);
-}
+Eigen::MatrixXd closedFormQR(const Problem& p, double lambda);
 
 // The minimum-norm weighted least-squares solution, M x 3, for any rank.
-inline Eigen::MatrixXd minimumNorm(const Problem& p)
-{
-    Eigen::VectorXd s = weights(p).cwiseSqrt();
-    Eigen::MatrixXd A = s.asDiagonal() * responses(p).transpose();
-    Eigen::MatrixXd B = s.asDiagonal() * targets(p);
-    return A.completeOrthogonalDecomposition().solve(B);
-}
+Eigen::MatrixXd minimumNorm(const Problem& p);
 
 // A solver's result rows (M x 4 floats) as an M x 3 matrix.
-inline Eigen::MatrixXd coefficients(const std::vector<float>& H, int M)
-{
-    return Eigen::Map<const RowMajor>(H.data(), M, 4).leftCols(3).cast<double>();
-}
+Eigen::MatrixXd coefficients(const std::vector<float>& H, int M);
 
 // Largest element difference relative to the largest element of the reference.
-inline double relativeError(const Eigen::MatrixXd& got, const Eigen::MatrixXd& want)
-{
-    double scale = std::max(want.cwiseAbs().maxCoeff(), 1e-30);
-    return (got - want).cwiseAbs().maxCoeff() / scale;
-}
+double relativeError(const Eigen::MatrixXd& got, const Eigen::MatrixXd& want);
 
 using Unregularised = void (*)(int, int, const float*, const float*, const float*, float*);
 using Regularised = void (*)(int, int, const float*, const float*, const float*, float*, float);
