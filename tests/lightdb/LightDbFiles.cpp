@@ -4,7 +4,16 @@
 
 #include <sqlite3.h>
 
+// gcc says it builds with AddressSanitizer by __SANITIZE_ADDRESS__, clang by
+// __has_feature.
 #if defined(__SANITIZE_ADDRESS__)
+#define LIGHTDB_TEST_ASAN 1
+#elif defined(__has_feature)
+#if __has_feature(address_sanitizer)
+#define LIGHTDB_TEST_ASAN 1
+#endif
+#endif
+#if defined(LIGHTDB_TEST_ASAN)
 #include <sanitizer/lsan_interface.h>
 #endif
 
@@ -84,11 +93,11 @@ locale_t generatedGermanLocale()
     if (std::system(command.c_str()) != 0)
         return locale_t(0);
     setenv("LOCPATH", folder.str().c_str(), 1);
-#if defined(__SANITIZE_ADDRESS__)
+#if defined(LIGHTDB_TEST_ASAN)
     __lsan_disable(); // the C library keeps a copy of LOCPATH it never frees
 #endif
     locale_t locale = newlocale(LC_ALL_MASK, "de_DE.UTF-8", locale_t(0));
-#if defined(__SANITIZE_ADDRESS__)
+#if defined(LIGHTDB_TEST_ASAN)
     __lsan_enable();
 #endif
     unsetenv("LOCPATH");
