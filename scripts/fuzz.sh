@@ -1,18 +1,21 @@
 #!/usr/bin/env bash
-# Builds the libFuzzer targets (clang, ASan + UBSan, build-fuzz/) and runs each
-# for SECONDS (default 25) from its seed corpus. Any finding stops the run of
-# that target, leaves the input in build-fuzz/artifacts/ and fails the script.
+# Builds the libFuzzer targets (clang, ASan + UBSan, in build-asan/, which the
+# sanitizer run of the tests shares: scripts/trees.sh) and runs each for
+# SECONDS (default 25) from its seed corpus. Any finding stops the run of that
+# target, leaves the input in build-asan/artifacts/ and fails the script.
 #
 # Usage: scripts/fuzz.sh [SECONDS] [TARGET...]      (every target when none is named)
 #   FUZZ_JOBS=N    targets fuzzed at the same time (default 2)
 #   FUZZ_ARGS=...  more libFuzzer flags, e.g. "-max_len=20000" or "-dict=..."
 # Long runs: scripts/fuzz.sh 3600 light_databases   (an hour); the corpus grows
-# in build-fuzz/corpus/<target>/ and is kept between runs.
+# in build-asan/corpus/<target>/ and is kept between runs.
 set -euo pipefail
 here=$(cd "$(dirname "$0")/.." && pwd)
+# shellcheck source=scripts/trees.sh
+. "$here/scripts/trees.sh"
 seconds=${1:-25}
 [ $# -gt 0 ] && shift
-build=$here/build-fuzz
+build=$here/build-asan
 jobs=${FUZZ_JOBS:-2}
 
 targets=("$@")
@@ -22,9 +25,7 @@ if [ ${#targets[@]} -eq 0 ]; then
 fi
 
 echo "fuzz: building the targets in $build"
-CC=clang CXX=clang++ VANTISH_BUILD_DIR=$build VANTISH_BUILD_TYPE=RelWithDebInfo \
-    VANTISH_CMAKE_ARGS="-DVANTISH_FUZZ=ON -DVANTISH_BENCH=OFF" VANTISH_BUILD_TARGETS=fuzz_targets \
-    "$here/scripts/setup.sh"
+sanitizer_build build-asan address fuzz_targets
 
 # Seeds: the in-tree corpus (hand-made inputs and every past finding), seeds
 # generated from the record layouts, and the sample devices of data/.

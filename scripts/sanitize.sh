@@ -1,13 +1,15 @@
 #!/usr/bin/env bash
-# The test suite under sanitizers:
-#   address  every test, built with AddressSanitizer and UndefinedBehaviorSanitizer (build-asan/)
+# The test suite under sanitizers, built with clang at -O1 (scripts/trees.sh):
+#   address  every test, built with AddressSanitizer and UndefinedBehaviorSanitizer
+#            (build-asan/, the folder that also builds the fuzz targets)
 #   thread   the tests of the code that runs on several threads, with the stress and fault
 #            tests, built with ThreadSanitizer (build-tsan/)
 # Usage: scripts/sanitize.sh [address] [thread]   (both when none is named)
 # Any sanitizer report fails the test that triggered it, and so the script.
 set -euo pipefail
 here=$(cd "$(dirname "$0")/.." && pwd)
-jobs=$(nproc)
+# shellcheck source=scripts/trees.sh
+. "$here/scripts/trees.sh"
 
 # The ThreadSanitizer run: every test of the programs whose code runs on more
 # than one thread (the work queues, publication of the per-chip database,
@@ -31,22 +33,14 @@ export VANTISH_STRESS_SCALE=${VANTISH_STRESS_SCALE:-1}
 
 section() { printf '\n==== %s ====\n' "$*"; }
 
-build() { # folder sanitizer [targets...]
-    local folder=$1 sanitizer=$2
-    shift 2
-    VANTISH_BUILD_DIR="$here/$folder" VANTISH_BUILD_TYPE=RelWithDebInfo \
-        VANTISH_CMAKE_ARGS="-DVANTISH_SANITIZE=$sanitizer -DVANTISH_BENCH=OFF -DVANTISH_FUZZ=OFF" \
-        VANTISH_BUILD_TARGETS="$*" "$here/scripts/setup.sh"
-}
-
 run_address() {
     section "AddressSanitizer + UndefinedBehaviorSanitizer: build (build-asan)"
     local start=$SECONDS
-    build build-asan address
+    sanitizer_build build-asan address
     echo "built in $((SECONDS - start)) s"
     section "AddressSanitizer + UndefinedBehaviorSanitizer: every test"
     start=$SECONDS
-    (cd "$here/build-asan" && ctest --output-on-failure -j"$jobs")
+    run_ctest "$here/build-asan"
     echo "tests ran in $((SECONDS - start)) s"
 }
 
@@ -60,13 +54,13 @@ run_thread() {
         targets+=("test_$folder")
         labels+=("$folder")
     done
-    build build-tsan thread "${targets[@]}"
+    sanitizer_build build-tsan thread "${targets[@]}"
     echo "built in $((SECONDS - start)) s"
     section "ThreadSanitizer: tests of ${labels[*]}"
     start=$SECONDS
     local pattern
     pattern="^($(IFS='|'; echo "${labels[*]}"))\$"
-    (cd "$here/build-tsan" && ctest --output-on-failure -j"$jobs" -L "$pattern" -E 'DeathTest|NOT_BUILT' --no-tests=error)
+    run_ctest "$here/build-tsan" -L "$pattern" -E 'DeathTest|NOT_BUILT' --no-tests=error
     echo "tests ran in $((SECONDS - start)) s"
 }
 
