@@ -49,10 +49,18 @@ void writeEventXYZ(IOHIDEventRef event, const XYZ& xyz)
     IOHIDEventSetIntegerValue(event, kIOHIDEventFieldAmbientLightColorSpace, 1);
 }
 
+// Counts one more occurrence; true for the ones that are logged (the first,
+// then every kShortRecordLogInterval-th).
+bool countAndThrottle(std::atomic<uint64_t>& counter, uint64_t& count)
+{
+    count = counter.fetch_add(1) + 1;
+    return count % kShortRecordLogInterval == 1;
+}
+
 void reportShortRecord(std::atomic<uint64_t>& shortRecords, size_t length)
 {
-    const uint64_t count = shortRecords.fetch_add(1) + 1;
-    if (count % kShortRecordLogInterval == 1)
+    uint64_t count = 0;
+    if (countAndThrottle(shortRecords, count))
         VLOG_ERROR("Sample record of %lu bytes is shorter than %lu bytes, event passed unchanged (%llu so far)\n",
                    (unsigned long) length, (unsigned long) ALSSampleRecord::kFilterSize, (unsigned long long) count);
 }
@@ -61,8 +69,8 @@ void reportShortRecord(std::atomic<uint64_t>& shortRecords, size_t length)
 // one whose fit gives no positive Y. Logged like short records.
 void reportNonFiniteLux(std::atomic<uint64_t>& nonFiniteLux, float lux)
 {
-    const uint64_t count = nonFiniteLux.fetch_add(1) + 1;
-    if (count % kShortRecordLogInterval == 1)
+    uint64_t count = 0;
+    if (countAndThrottle(nonFiniteLux, count))
         VLOG_ERROR("Sample lux %f is not a finite number, colour set to zero (%llu so far)\n", double(lux),
                    (unsigned long long) count);
 }

@@ -17,10 +17,7 @@ using cf::doubleValue;
 using cf::intValue;
 using cf::isNumber;
 
-CFArrayRef asArray(CFTypeRef value)
-{
-    return value && CFGetTypeID(value) == CFArrayGetTypeID() ? static_cast<CFArrayRef>(value) : nullptr;
-}
+CFArrayRef asArray(CFTypeRef value) { return cf::isArray(value) ? static_cast<CFArrayRef>(value) : nullptr; }
 
 // Element `index` as a number; nothing for a missing or non-number element,
 // which leaves the stored value as it was.

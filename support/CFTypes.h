@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <optional>
 #include <span>
+#include <type_traits>
 
 namespace cf {
 
@@ -29,34 +30,23 @@ inline std::span<const uint8_t> bytesOf(CFDataRef data)
 // The bytes of a value already checked to be data.
 inline std::span<const uint8_t> bytesOf(CFTypeRef data) { return bytesOf(static_cast<CFDataRef>(data)); }
 
-// A number as int, or nothing when the value is not a number.
-inline std::optional<int> intValue(CFTypeRef value)
+// A number as T (int, float or double), or nothing when the value is not a number.
+template <typename T>
+std::optional<T> numberValue(CFTypeRef value)
 {
-    int result = 0;
+    static_assert(std::is_same_v<T, int> || std::is_same_v<T, float> || std::is_same_v<T, double>);
+    constexpr CFNumberType type = std::is_same_v<T, int>     ? kCFNumberIntType
+                                  : std::is_same_v<T, float> ? kCFNumberFloatType
+                                                             : kCFNumberDoubleType;
+    T result{};
     if (!isNumber(value))
         return std::nullopt;
-    CFNumberGetValue(static_cast<CFNumberRef>(value), kCFNumberIntType, &result);
+    CFNumberGetValue(static_cast<CFNumberRef>(value), type, &result);
     return result;
 }
 
-// A number as double, or nothing when the value is not a number.
-inline std::optional<double> doubleValue(CFTypeRef value)
-{
-    double result = 0.0;
-    if (!isNumber(value))
-        return std::nullopt;
-    CFNumberGetValue(static_cast<CFNumberRef>(value), kCFNumberDoubleType, &result);
-    return result;
-}
-
-// A number as float, or nothing when the value is not a number.
-inline std::optional<float> floatValue(CFTypeRef value)
-{
-    float result = 0.0f;
-    if (!isNumber(value))
-        return std::nullopt;
-    CFNumberGetValue(static_cast<CFNumberRef>(value), kCFNumberFloatType, &result);
-    return result;
-}
+inline std::optional<int> intValue(CFTypeRef value) { return numberValue<int>(value); }
+inline std::optional<double> doubleValue(CFTypeRef value) { return numberValue<double>(value); }
+inline std::optional<float> floatValue(CFTypeRef value) { return numberValue<float>(value); }
 
 } // namespace cf
